@@ -1,0 +1,29 @@
+#include "boot/legacy_icu.hpp"
+
+#include <err.h>
+
+#include "fs/file_system.hpp"
+#include "paths.hpp"
+
+namespace boot {
+
+void migrate_legacy_icu_link() {
+  if (fs::path_exists(paths::legacy_icu_link) && !fs::path_exists(paths::icu_link)) {
+    try {
+      fs::create_symlink(fs::read_symlink(paths::legacy_icu_link), paths::icu_link);
+    } catch (...) {
+      // Programs do without the link, and the next switch makes it.
+      ::warn("Could not migrate %s to %s", paths::legacy_icu_link, paths::icu_link);
+    }
+  }
+  if (fs::path_exists(paths::legacy_icu_link)) {
+    try {
+      fs::remove(paths::legacy_icu_link);
+    } catch (...) {
+      // Nothing reads the old place any more, so what stays there does no harm.
+      ::warn("Could not remove %s", paths::legacy_icu_link);
+    }
+  }
+}
+
+}  // namespace boot

@@ -1,0 +1,10 @@
+#pragma once
+
+namespace boot {
+
+/// Moves the ICU link from its place in earlier releases, "/var/db/icutz", to "/var/db/timezone/icutz", unless
+/// something is there already; the old link is deleted either way. A link whose target is missing counts as absent,
+/// at both places. Failures give warnings only; after a failed copy the old link is deleted all the same.
+void migrate_legacy_icu_link();
+
+}  // namespace boot

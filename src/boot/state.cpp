@@ -1,0 +1,75 @@
+#include "boot/state.hpp"
+
+#include <err.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <string_view>
+
+#include "fs/file_system.hpp"
+#include "paths.hpp"
+#include "platform/data_protection.hpp"
+
+namespace boot {
+namespace {
+
+constexpr int protection_class = 4;
+constexpr int rejected_link = -1;
+
+/// Makes the file unless it exists. Returns whether every call succeeded; errno is that of the last that did not.
+bool touch(const char* path) noexcept {
+  const int descriptor = platform::open_protected(path, O_RDWR | O_CREAT, protection_class, 0666);
+  if (descriptor < 0) {
+    return false;
+  }
+  struct stat status;
+  const bool usable = ::fstat(descriptor, &status) == 0;
+  const bool closed = ::close(descriptor) == 0;
+  return usable && closed;
+}
+
+}  // namespace
+
+void prepare_state_directories() noexcept {
+  set_protection_class(paths::state_directory);
+  set_protection_class(paths::dataset_root);
+}
+
+void set_protection_class(const char* path) noexcept {
+  const int descriptor = ::open(path, O_RDONLY | O_CLOEXEC);
+  if (descriptor < 0) {
+    // A device that has no dataset yet may have no directory either, and the data is of use in any class.
+    return;
+  }
+  platform::set_protection_class(descriptor, protection_class);
+  ::close(descriptor);
+}
+
+std::string latest_dataset_path() { return fs::read_symlink(paths::latest_link); }
+
+std::string current_dataset_path() { return dataset_path_from_link(fs::read_symlink(paths::zoneinfo_link)); }
+
+std::string dataset_path_from_link(const std::string& target) {
+  constexpr std::string_view root = paths::dataset_root;
+  if (target.size() > root.size() && target.starts_with(root)) {
+    const auto last_slash = target.rfind('/');
+    // At least one byte must stand between the root and that slash: the name of the dataset.
+    if (last_slash > root.size()) {
+      return target.substr(0, last_slash);
+    }
+  } else if (target == paths::system_zoneinfo) {
+    return {};
+  }
+  ::warn("Bad zoneinfo link %s", target.c_str());
+  throw rejected_link;
+}
+
+void mark_needs_cleanup() noexcept {
+  if (!touch(paths::needs_cleanup)) {
+    // The clean-up job then finds out at a later switch; the data that is live is right all the same.
+    ::warn("Cannot touch file %s", paths::needs_cleanup);
+  }
+}
+
+}  // namespace boot

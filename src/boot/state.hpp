@@ -1,0 +1,37 @@
+#pragma once
+
+#include <string>
+
+/// What happens at a boot: the state directory and its links are read, one dataset is made live, the links of
+/// earlier releases and the local time link are repaired.
+namespace boot {
+
+/// Puts the state directory and the dataset root into their data-protection class, where the platform has them.
+/// A directory that is missing or cannot be opened is passed over in silence; none is made.
+void prepare_state_directories() noexcept;
+
+/// Does the same for one directory.
+void set_protection_class(const char* path) noexcept;
+
+/// Returns what "tz_latest" holds, unexamined: the path of the newest installed dataset. Empty when there is no link.
+///
+/// Throws errno, after a warning, when something other than a link stands there.
+std::string latest_dataset_path();
+
+/// Returns the path of the dataset that the live zoneinfo link points into, empty for the system partition.
+///
+/// Throws, after a warning, what `dataset_path_from_link` throws, for a missing link too, and errno when something
+/// other than a link stands there.
+std::string current_dataset_path();
+
+/// Returns the path of the dataset that the zoneinfo link's `target` lies in: for a target below
+/// "/var/db/timezone/tz/" all before the last "/", for the system partition's zone files the empty string.
+///
+/// Throws the `int` -1, after a warning, for every other target.
+std::string dataset_path_from_link(const std::string& target);
+
+/// Leaves the marker that tells the clean-up job that an installed dataset was given up. A marker that is already
+/// there keeps its contents. A failure gives a warning only.
+void mark_needs_cleanup() noexcept;
+
+}  // namespace boot

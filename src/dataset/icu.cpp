@@ -1,0 +1,105 @@
+#include "dataset/icu.hpp"
+
+#include <err.h>
+#include <fts.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstring>
+#include <memory>
+
+#include "fs/file_system.hpp"
+#include "paths.hpp"
+
+namespace dataset {
+namespace {
+
+struct walk_closer {
+  void operator()(FTS* walk) const noexcept { ::fts_close(walk); }
+};
+using walk_handle = std::unique_ptr<FTS, walk_closer>;
+
+bool is_file_readable_by_all(const FTSENT& entry) {
+  return entry.fts_errno == 0 && entry.fts_info == FTS_F && (entry.fts_statp->st_mode & S_IROTH) != 0;
+}
+
+}  // namespace
+
+vrel_icu::vrel_icu() : data_directory(paths::system_icu) { initialize(); }
+
+vrel_icu::vrel_icu(const std::string& path)
+    : vrel_dataset_component(path), data_directory(path.empty() ? paths::system_icu : path + "/icutz") {
+  initialize();
+}
+
+void vrel_icu::initialize() {
+  if (dataset_path.empty()) {
+    schema = fs::first_word(data_directory + "/icutzformat.txt");
+    return;
+  }
+  read_schema_from_file_names();
+  if (schema.empty()) {
+    ::warn("No ICU schema found for %s", dataset_path.c_str());
+  }
+}
+
+void vrel_icu::read_schema_from_file_names() {
+  char* const roots[] = {data_directory.data(), nullptr};
+  const walk_handle walk(::fts_open(roots, FTS_COMFOLLOW | FTS_PHYSICAL | FTS_XDEV, nullptr));
+  if (!walk) {
+    fs::warn_and_raise("tz_icu::initialize: fts_open of %s failed, %s", data_directory.c_str(), std::strerror(errno));
+  }
+  while (FTSENT* const entry = ::fts_read(walk.get())) {
+    if (!schema.empty()) {
+      return;
+    }
+    if (entry->fts_level != 1) {
+      continue;
+    }
+    if (entry->fts_info == FTS_D) {
+      // Nothing further down can match, and a large tree there must not delay a boot.
+      ::fts_set(walk.get(), entry, FTS_SKIP);
+    } else if (is_file_readable_by_all(*entry)) {
+      schema = schema_in_file_name({entry->fts_name, entry->fts_namelen});
+    }
+  }
+}
+
+bool vrel_icu::compatible_schema(const vrel_dataset_component* other) const {
+  const auto* const other_icu = dynamic_cast<const vrel_icu*>(other);
+  if (other_icu == nullptr) {
+    ::warn("vrel_icu::compatible_schema: could not dynamic_cast other component");
+    return false;
+  }
+  return schema == other_icu->schema;
+}
+
+void vrel_icu::activate() const {
+  try {
+    fs::remove(paths::icu_link);
+    fs::remove(paths::legacy_icu_link);
+  } catch (...) {
+    // The system's data needs no link; for installed data the new link fails if the old one is still there.
+    ::warn("unlink of ICU softlink failed");
+  }
+  if (!dataset_path.empty()) {
+    fs::create_symlink(data_directory, paths::icu_link);
+  }
+}
+
+std::string_view schema_in_file_name(std::string_view name) noexcept {
+  constexpr std::string_view prefix = "icutz";
+  constexpr std::string_view suffix = ".dat";
+  if (!name.starts_with(prefix) || !name.ends_with(suffix)) {
+    return {};
+  }
+  name.remove_prefix(prefix.size());
+  name.remove_suffix(suffix.size());
+  const auto digits = name.find_first_not_of("0123456789");
+  if (name.size() < 2 || digits != name.size() - 1 || std::string_view("lbe").find(name.back()) == name.npos) {
+    return {};
+  }
+  return name;
+}
+
+}  // namespace dataset

@@ -1,0 +1,225 @@
+#include "dataset/dataset.hpp"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <regex>
+
+#include "dataset/icu.hpp"
+#include "sandbox.hpp"
+
+namespace {
+
+using dataset::vrel_dataset, dataset::vrel_icu, dataset::vrel_zoneinfo;
+using sandbox::changed, sandbox::expect_warnings, sandbox::observe, sandbox::read_disk, sandbox::stage;
+
+const std::string installed = "/var/db/timezone/tz/2021b.1.0";
+const std::string no_schema = "No ICU schema found for " + installed;
+
+TEST(Zoneinfo, ReadsItsVersion) {
+  stage("system 2021a 44l, tz/2021b.1.0/zoneinfo/+VERSION = 2021b and more");
+  EXPECT_EQ(vrel_zoneinfo().zoneinfo_version(), "2021a");
+  EXPECT_EQ(vrel_zoneinfo("").zoneinfo_version(), "2021a");
+  EXPECT_EQ(vrel_zoneinfo(installed).zoneinfo_version(), "2021b");
+  EXPECT_EQ(vrel_zoneinfo("/var/db/timezone/tz/none").zoneinfo_version(), "");
+}
+
+TEST(Zoneinfo, FitsAnyComponent) {
+  stage("");
+  const vrel_icu icu;
+  EXPECT_TRUE(vrel_zoneinfo().compatible_schema(&icu));
+}
+
+struct icu_situation {
+  const char* situation;
+  const char* schema;
+  bool found = true;
+};
+
+TEST(Icu, SchemaComesFromTheNameOfAReadableFileDirectlyInTheDirectory) {
+  const icu_situation table[] = {
+      {"tz/2021b.1.0/icutz/icutz44l.dat =, tz/2021b.1.0/icutz/README =", "44l"},
+      {"tz/2021b.1.0/icutz/icutz44l.dat.bak =, tz/2021b.1.0/icutz/icutz7e.dat =", "7e"},
+      {"tz/2021b.1.0/icutz/a/icutz46b.dat =, tz/2021b.1.0/icutz/icutz44b.dat =, tz/2021b.1.0/icutz/z/icutz46b.dat =",
+       "44b"},
+      {"tz/elsewhere/icutz44l.dat =, tz/2021b.1.0/icutz > ../elsewhere", "44l"},
+      {"tz/2021b.1.0/icutz/icutz44l.dat > ../zoneinfo", "", false},
+      {"tz/2021b.1.0/icutz/icutz44l.dat/icutz44l.dat =", "", false},
+      {"tz/2021b.1.0/icutz/ICUTZ44L.DAT =", "", false},
+      {"tz/2021b.1.0/icutz = icutz44l.dat", "", false},
+      {"tz/2021b.1.0/icutz /", "", false},
+      {"", "", false},
+  };
+  for (const auto& [situation, schema, found] : table) {
+    stage(std::string(situation) + ", system - " + (found ? schema : "-"));
+    const auto result = observe([] {
+      const vrel_icu system;
+      EXPECT_TRUE(vrel_icu(installed).compatible_schema(&system));
+    });
+    expect_warnings(result.warnings, found ? std::vector<std::string>() : std::vector{no_schema});
+    EXPECT_EQ(result.thrown, "") << situation;
+  }
+}
+
+TEST(Icu, AFileThatOthersCannotReadNamesNoSchema) {
+  stage("dataset 2021b.1.0 44l, system - -");
+  ::chmod((installed + "/icutz/icutz44l.dat").c_str(), 0600);
+  const auto result = observe([] {
+    const vrel_icu system;
+    EXPECT_TRUE(vrel_icu(installed).compatible_schema(&system));
+  });
+  expect_warnings(result.warnings, {no_schema});
+}
+
+TEST(Icu, FileNamesMatchAsTheRegularExpressionMatches) {
+  using namespace std::string_view_literals;
+  const std::regex pattern("icutz([0-9]+[lbe])\\.dat");
+  int accepted = 0;
+  for (const std::string prefix : {"icutz", "icut", "Icutz", "xicutz", ""}) {
+    for (const std::string suffix : {".dat", "-dat", "dat", ".DAT", ".dat\n", ".dat.dat", ""}) {
+      sandbox::for_each_string("09lbexL.\n\xff\0"sv, 4, [&](const std::string& middle) {
+        const auto name = prefix + middle + suffix;
+        std::smatch groups;
+        const auto expected = std::regex_match(name, groups, pattern) ? groups[1].str() : "";
+        accepted += expected.empty() ? 0 : 1;
+        if (dataset::schema_in_file_name(name) != expected) {
+          ADD_FAILURE() << testing::PrintToString(name);
+        }
+      });
+    }
+  }
+  EXPECT_GT(accepted, 40);
+}
+
+TEST(Icu, ATreeBelowTheDirectoryIsNotWalked) {
+  stage("dataset 2021b.1.0 -");
+  const auto duration = [] {
+    const auto start = std::chrono::steady_clock::now();
+    observe([] { vrel_icu icu(installed); });
+    return std::chrono::steady_clock::now() - start;
+  };
+  const auto without = duration();
+  for (int i = 0; i < 18000; ++i) {
+    std::filesystem::create_directories(installed + "/icutz/a/" + std::to_string(i));
+  }
+  EXPECT_LT(duration(), without * 10 + std::chrono::milliseconds(5));
+}
+
+TEST(Icu, FitsTheSameSchemaOnly) {
+  stage("system 2021a 44l, dataset same 44l, dataset other 46l, dataset none -, dataset none2 -");
+  const vrel_icu system;
+  const vrel_icu same("/var/db/timezone/tz/same");
+  const vrel_icu other("/var/db/timezone/tz/other");
+  const vrel_zoneinfo zoneinfo;
+  const auto result = observe([&] {
+    const vrel_icu none("/var/db/timezone/tz/none");
+    const vrel_icu none_either("/var/db/timezone/tz/none2");
+    EXPECT_TRUE(same.compatible_schema(&system));
+    EXPECT_FALSE(other.compatible_schema(&system));
+    EXPECT_FALSE(none.compatible_schema(&system));
+    EXPECT_TRUE(none.compatible_schema(&none_either));
+    EXPECT_FALSE(same.compatible_schema(&zoneinfo));
+  });
+  expect_warnings(result.warnings, {"No ICU schema found for /var/db/timezone/tz/none",
+                                    "No ICU schema found for /var/db/timezone/tz/none2",
+                                    "vrel_icu::compatible_schema: could not dynamic_cast other component"});
+}
+
+struct activation {
+  const char* situation;
+  const char* path;
+  const char* changes;
+  int raised = 0;
+  std::vector<std::string> warnings = {};
+};
+
+TEST(Dataset, ActivationRepointsTheLinks) {
+  const std::string created = "create_symlink: from /var/db/timezone/";
+  const activation table[] = {
+      {"", "", "zoneinfo > /usr/share/zoneinfo.default"},
+      {"", "@", "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz"},
+      {"zoneinfo > x, icutz > x, /var/db/icutz > x", "",
+       "zoneinfo > /usr/share/zoneinfo.default, - icutz, - /var/db/icutz"},
+      {"zoneinfo = x, icutz = x, /var/db/icutz = x", "@",
+       "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz, - /var/db/icutz"},
+      {"zoneinfo /, icutz > x",
+       "@",
+       "",
+       EEXIST,
+       {"remove: could not remove /var/db/timezone/zoneinfo: Is a directory", "Unlink of zoneinfo softlink failed",
+        created + "zoneinfo to /var/db/timezone/tz/2021b.1.0/zoneinfo: File exists"}},
+      {"icutz /, /var/db/icutz > x",
+       "@",
+       "zoneinfo > @2021b.1.0/zoneinfo",
+       EEXIST,
+       {"remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed",
+        created + "icutz to /var/db/timezone/tz/2021b.1.0/icutz: File exists"}},
+      {"icutz /, /var/db/icutz > x",
+       "",
+       "zoneinfo > /usr/share/zoneinfo.default",
+       0,
+       {"remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed"}},
+      {"- .", "", "", ENOENT, {created + "zoneinfo to /usr/share/zoneinfo.default: No such file or directory"}},
+  };
+  for (const auto& row : table) {
+    stage(std::string("system 2021a 44l, dataset 2021b.1.0 44l, ") + row.situation);
+    const vrel_dataset chosen(*row.path == '@' ? installed : "");
+    const auto before = read_disk();
+    const auto result = observe([&] { activate_all(chosen); });
+    EXPECT_EQ(read_disk(), changed(before, row.changes)) << row.situation;
+    EXPECT_EQ(result.thrown, row.raised == 0 ? "" : std::to_string(row.raised)) << row.situation;
+    expect_warnings(result.warnings, row.warnings);
+  }
+}
+
+TEST(Dataset, PathsOutsideTheRootAreRejected) {
+  stage("system 2021a 44l");
+  for (const std::string path : {"/var/db/timezone/tz/", "/var/db/timezone/tz", "/var/db/timezone/tzdata/2020a.1.0",
+                                 "/private/var/db/timezone/tz/2020a.1.0", "var/db/timezone/tz/2020a.1.0", "x"}) {
+    const auto result = observe([&] { const vrel_dataset rejected(path); });
+    EXPECT_EQ(result.thrown, "badpath") << path;
+    expect_warnings(result.warnings, {"vrel_dataset::create_components: bad path " + path});
+  }
+}
+
+TEST(Dataset, NamesItsVersion) {
+  stage("system 2021a 44l, dataset 2021b.1.0 44l, dataset 2021b.1.0/ 44l, dataset x 44l");
+  const std::pair<const char*, const char*> table[] = {{"", "2021a.1.0"},
+                                                       {"/var/db/timezone/tz/2021b.1.0", "2021b.1.0"},
+                                                       {"/var/db/timezone/tz/2021b.1.0/", "2021b.1.0/"},
+                                                       {"/var/db/timezone/tz/x", "x"}};
+  for (const auto& [path, version] : table) {
+    observe([&, &p = path, &v = version] { EXPECT_EQ(version_string(vrel_dataset(p)), v); });
+  }
+}
+
+TEST(Dataset, WithoutAValidVersionIsBuiltAndOlderThanAll) {
+  stage("system - 44l, dataset 0a 44l");
+  const vrel_dataset valid("/var/db/timezone/tz/0a");
+  const auto result = observe([&] {
+    const vrel_dataset system;
+    EXPECT_EQ(version_string(system), ".1.0");
+    EXPECT_TRUE(newer_than(valid, system));
+    EXPECT_FALSE(newer_than(system, valid));
+    EXPECT_TRUE(all_compatible(valid, system));
+  });
+  expect_warnings(result.warnings,
+                  {"Cannot parse version string .1.0, results.size() = 0", "Cannot parse version string .1.0"});
+  EXPECT_THROW(vrel_dataset("/var/db/timezone/tz/2147483648a"), std::out_of_range);
+}
+
+TEST(Dataset, PathsAreComparedAsBytes) {
+  stage("system 2021a 44l, dataset 2021b.1.0 44l");
+  observe([] {
+    EXPECT_TRUE(same_path(vrel_dataset(), vrel_dataset("")));
+    EXPECT_TRUE(same_path(vrel_dataset(installed), vrel_dataset(installed)));
+    EXPECT_FALSE(same_path(vrel_dataset(), vrel_dataset(installed)));
+    EXPECT_FALSE(same_path(vrel_dataset(installed + "/"), vrel_dataset(installed)));
+  });
+}
+
+}  // namespace

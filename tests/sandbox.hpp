@@ -1,0 +1,55 @@
+#pragma once
+
+#include <functional>
+#include <map>
+#include <string>
+#include <string_view>
+#include <vector>
+
+/// Where the tests run: a private mount namespace, with the program's real paths on fresh file systems.
+///
+/// A situation is a list of statements, separated by ", ". Their paths are relative to /var/db/timezone:
+///   system VERSION SCHEMA    the system partition's data; "-" leaves the version or the schema file out
+///   dataset VERSION SCHEMA   an installed dataset; "-" leaves the ICU data file out
+///   PATH > TARGET            a link; "@" at the front of a target stands for /var/db/timezone/tz/
+///   PATH = TEXT              a file
+///   PATH /                   a directory
+///   - PATH                   nothing at PATH
+namespace sandbox {
+
+/// Moves this process into the sandbox, or ends it with the reason. The machine's own paths stay as they are.
+void enter();
+
+/// Clears the sandbox and builds a situation. Unless this says otherwise the state directory is there, with a local
+/// time link to Europe/Paris.
+void stage(std::string_view situation);
+
+/// All that stands below /var and /usr/share: path to "> TARGET", "= TEXT" or "/".
+using disk = std::map<std::string, std::string>;
+disk read_disk();
+
+/// What `before` becomes when statements of the last four kinds are carried out.
+disk changed(disk before, std::string_view statements);
+
+struct outcome {
+  int status = 0;                     // what a pass returned
+  std::string thrown;                 // an int in decimal, a standard exception's text, or empty
+  std::vector<std::string> warnings;  // without the program's name
+};
+
+outcome observe(const std::function<void()>& action);
+
+/// One pass in this process.
+outcome run_pass();
+
+/// One pass of the shipped binary; `prepare` is called in the new process before it starts.
+outcome run_release_binary(const std::function<void()>& prepare = [] {});
+
+/// Fails the test unless the warnings are the expected ones. An expected one may lack the text of errno.
+void expect_warnings(const std::vector<std::string>& warnings, const std::vector<std::string>& expected);
+
+/// Calls `visit` with every string of up to `longest` bytes out of `alphabet`.
+void for_each_string(std::string_view alphabet, std::size_t longest,
+                     const std::function<void(const std::string&)>& visit);
+
+}  // namespace sandbox
