@@ -145,6 +145,9 @@ void enter_namespaces() {
 /// The warnings in a text of lines that each begin with the program's name. A line that does not begin so belongs to
 /// the warning before it, whose text holds a line end.
 std::vector<std::string> warnings_in(const std::string& text) {
+  if (text.empty()) {
+    return {};
+  }
   auto warnings = split("\n" + text, std::string("\n") + program + ": ");
   if (!warnings.empty() && warnings.back().ends_with('\n')) {
     warnings.back().pop_back();
@@ -193,7 +196,8 @@ void enter() {
     give_up("cannot open " RELEASE_BINARY, "Build it first: cmake --preset release && cmake --build --preset release");
   }
   // A sanitizer's report must reach the terminal while a test captures standard error.
-  __sanitizer_set_report_fd(reinterpret_cast<void*>(static_cast<std::intptr_t>(::dup(STDERR_FILENO))));
+  const std::intptr_t terminal = ::dup(STDERR_FILENO);
+  __sanitizer_set_report_fd(reinterpret_cast<void*>(terminal));  // NOLINT(performance-no-int-to-ptr)
   program_invocation_short_name = const_cast<char*>(program);
   enter_namespaces();
   if (::mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {

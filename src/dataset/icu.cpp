@@ -96,10 +96,9 @@ std::string_view schema_in_file_name(std::string_view name) noexcept {
   name.remove_prefix(prefix.size());
   name.remove_suffix(suffix.size());
   const auto digits = name.find_first_not_of("0123456789");
-  if (name.size() < 2 || digits != name.size() - 1 || std::string_view("lbe").find(name.back()) == name.npos) {
-    return {};
-  }
-  return name;
+  const bool digits_and_byte_order = name.size() >= 2 && digits == name.size() - 1 &&
+                                     std::string_view("lbe").find(name.back()) != std::string_view::npos;
+  return digits_and_byte_order ? name : std::string_view();
 }
 
 }  // namespace dataset

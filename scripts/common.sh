@@ -1,0 +1,81 @@
+# Sourced by the other scripts, from any directory; they go on at the top of the tree.
+# shellcheck shell=bash
+set -euo pipefail
+script=$(realpath "$0")
+cd "$(dirname "${BASH_SOURCE[0]}")/.."
+
+die() {
+  printf '%s: %s\n' "${script##*/}" "$*" >&2
+  exit 1
+}
+
+# need PACKAGE...: installs the Debian packages that are missing. Does nothing when none is.
+need() {
+  local package missing=() as_root=()
+  for package; do
+    [[ $(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null) == installed ]] || missing+=("$package")
+  done
+  ((${#missing[@]})) || return 0
+  ((EUID == 0)) || as_root=(sudo)
+  "${as_root[@]}" apt-get update -qq
+  "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get install -y -qq --no-install-recommends "${missing[@]}"
+}
+
+build() {
+  need g++ cmake ninja-build
+  cmake --preset "$1" >/dev/null
+  cmake --build --preset "$1"
+}
+
+# Runs the calling script a second time, in a private mount namespace, and returns in that second run only. There /var
+# and /usr/share are fresh file systems, /var/tzdata.zi is the source of the machine's zone data, and paths relative to
+# the top of the tree still work, wherever that is.
+enter_private_namespace() {
+  local here user=()
+  here=$(readlink /proc/self/ns/mnt)
+  if [[ ${TZRECONCILE_OUTSIDE:-$here} == "$here" ]]; then
+    ((EUID == 0)) || user=(--map-root-user)
+    unshare --mount "${user[@]}" true || die 'no private mount namespace: run this as root, or allow user namespaces
+with sysctl user.max_user_namespaces=10000 and, where they exist, kernel.unprivileged_userns_clone=1 and
+kernel.apparmor_restrict_unprivileged_userns=0'
+    export TZRECONCILE_OUTSIDE=$here
+    exec unshare --mount --propagation private "${user[@]}" "$script"
+  fi
+  mount -t tmpfs tmpfs /var
+  cp /usr/share/zoneinfo/tzdata.zi /var/
+  mount -t tmpfs tmpfs /usr/share
+}
+
+# zone_rule OFFSET NAME: the zone source on standard input, with Europe/Paris at that offset from UTC, the whole year,
+# from the end of the summer of 2026 on.
+zone_rule() {
+  awk -v rule="$1 - $2" '
+    /^Z Europe\/Paris / { inside = 1 }
+    inside && NF == 3 { print $0, "2026 O 25 1u"; print rule; inside = 0; changed = 1; next }
+    { print }
+    END { exit !changed }'
+}
+
+# following VERSION: the version after it, 2025b to 2025c, 2025z to 2025za.
+following() {
+  local last=${1: -1}
+  if [[ $last == z ]]; then echo "${1}a"; else echo "${1%?}$(tr a-y b-z <<<"$last")"; fi
+}
+
+# stage_system VERSION SCHEMA SOURCE: puts zone data compiled from SOURCE into the system partition.
+stage_system() {
+  rm -rf /usr/share/zoneinfo.default
+  mkdir -p /usr/share/zoneinfo.default /usr/share/icu
+  zic -d /usr/share/zoneinfo.default "$3"
+  echo "$1" >/usr/share/zoneinfo.default/+VERSION
+  echo "$2" >/usr/share/icu/icutzformat.txt
+}
+
+# stage_dataset VERSION SCHEMA SOURCE: installs a dataset as an update installer does, its name last.
+stage_dataset() {
+  local dataset=/var/db/timezone/tz/$1
+  mkdir -p "$dataset/zoneinfo" "$dataset/icutz"
+  zic -d "$dataset/zoneinfo" "$3"
+  touch "$dataset/icutz/icutz$2.dat"
+  ln -sfn "$dataset" /var/db/timezone/tz_latest
+}
