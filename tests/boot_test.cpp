@@ -52,6 +52,11 @@ const boot_row table[] = {
      installed_live + "dataset 2022a.1.0 44l, tz_latest > @2022a.1.0, TZVersionDiffRecord = a longer and older record",
      "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
      "TZVersionDiffRecord = 2021b.1.0_2022a.1.0"},
+    {"SwitchFromInstalledOfTheSystemsVersion",
+     "system 2021a 44l, dataset 2021a.1.0 44l, zoneinfo > @2021a.1.0/zoneinfo, dataset 2022a.1.0 44l, "
+     "tz_latest > @2022a.1.0",
+     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
+     "TZVersionDiffRecord = 2021a.1.0_2022a.1.0"},
     {"SwitchWithoutARecord", system_live + "dataset 2021b.1.0 44l, tz_latest > @2021b.1.0, TZVersionDiffRecord /",
      "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz"},
     {"SwitchWithoutAMarker",
@@ -74,10 +79,10 @@ const boot_row table[] = {
      "",
      {"No ICU schema found for /var/db/timezone/tz/2021b.1.0", refused("2021b.1.0", "2021a.1.0")}},
     {"LatestHasNoVersion",
-     system_live + "dataset new 44l, tz_latest > @new",
+     system_live + "dataset new -, tz_latest > @new",
      "",
      {"Cannot parse version string new, results.size() = 0", "Cannot parse version string new",
-      refused("new", "2021a.1.0")}},
+      "No ICU schema found for /var/db/timezone/tz/new", refused("new", "2021a.1.0")}},
 
     // The current dataset is rejected.
     {"SystemIsNewer",
@@ -98,6 +103,26 @@ const boot_row table[] = {
      "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
      "TZVersionDiffRecord = 2022z.1.0_2022a.1.0",
      {incompatible}},
+
+    {"CurrentIsMissing",
+     "system 2021a 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz",
+     "zoneinfo > /usr/share/zoneinfo.default, - icutz, needs_cleanup =",
+     {"No ICU schema found for /var/db/timezone/tz/2021b.1.0", incompatible}},
+    {"LatestFitsTheSystemUnlikeTheRejected",
+     "system 2021a 46l, dataset 2021b.1.0 44l, dataset 2022a.1.0 46l, zoneinfo > @2021b.1.0/zoneinfo, "
+     "tz_latest > @2022a.1.0, needs_cleanup/x =",
+     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, TZVersionDiffRecord = 2021a.1.0_2022a.1.0",
+     {incompatible, "Cannot touch file /var/db/timezone/needs_cleanup: Is a directory"}},
+    {"LatestFitsTheRejectedUnlikeTheSystem",
+     "system 2021a 46l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, "
+     "tz_latest > @2022a.1.0",
+     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     {incompatible, refused("2022a.1.0", "2021b.1.0")}},
+    {"RejectionIsToldBeforeTheReset",
+     "system 2022a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz /",
+     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     {incompatible, "remove: could not remove /var/db/timezone/icutz: Is a directory",
+      "unlink of ICU softlink failed"}},
 
     // The live zoneinfo link is invalid.
     {"FirstBoot", "system 2021a 44l", "zoneinfo > /usr/share/zoneinfo.default", {"Bad zoneinfo link ", invalid}},
@@ -130,6 +155,21 @@ const boot_row table[] = {
      {"remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed",
       "create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2021b.1.0/icutz: File exists", unable,
       "remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed"}},
+    {"InstalledSwitchBreaksOffHalfWay",
+     "system 2021a 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz /, "
+     "tz_latest > @2022a.1.0, needs_cleanup =",
+     "zoneinfo > /usr/share/zoneinfo.default, - needs_cleanup",
+     {"remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed",
+      "create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2022a.1.0/icutz: File exists", unable,
+      "remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed"}},
+    {"FallbackKeepsTheMarkerOfTheRejection",
+     "system 2022a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, tz_latest > /elsewhere",
+     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     {incompatible, "vrel_dataset::create_components: bad path /elsewhere", unable}},
+    {"CurrentVersionIsTooLarge",
+     "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > @9999999999a/zoneinfo, tz_latest > @2021b.1.0",
+     "zoneinfo > /usr/share/zoneinfo.default",
+     {unable}},
     {"SystemVersionIsTooLarge", "system 9999999999a 44l, zoneinfo > /usr/share/zoneinfo.default", "", {unable}, 1},
     {"SystemWithoutData",
      "zoneinfo > /usr/share/zoneinfo.default",

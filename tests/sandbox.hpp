@@ -37,7 +37,7 @@ struct outcome {
   std::vector<std::string> warnings;  // without the program's name
 };
 
-outcome observe(const std::function<void()>& action);
+[[nodiscard]] outcome observe(const std::function<void()>& action);
 
 /// One pass in this process.
 outcome run_pass();
@@ -45,7 +45,8 @@ outcome run_pass();
 /// One pass of the shipped binary; `prepare` is called in the new process before it starts.
 outcome run_release_binary(const std::function<void()>& prepare = [] {});
 
-/// Fails the test unless the warnings are the expected ones. An expected one may lack the text of errno.
+/// Fails the test unless the warnings are the expected ones. An expected one may leave out the text of errno, with
+/// which every warning ends.
 void expect_warnings(const std::vector<std::string>& warnings, const std::vector<std::string>& expected);
 
 /// Calls `visit` with every string of up to `longest` bytes out of `alphabet`.

@@ -72,7 +72,7 @@ void decide() {
   record_switch(in_force, latest);
 }
 
-/// Makes the right dataset live, or the system partition's when anything goes wrong. Returns whether one is.
+/// Makes the right dataset live, or the system partition's when anything goes wrong. Returns whether that went through.
 bool make_data_live() {
   try {
     decide();
@@ -84,11 +84,11 @@ bool make_data_live() {
     vrel_dataset::reset_to_system();
     return true;
   } catch (...) {
-    return false;  // The failed call has warned, and the local time can be repaired all the same.
+    return false;  // The local time can be repaired all the same.
   }
 }
 
-/// Repairs the local time link. Returns whether it is right.
+/// Repairs the local time link. Returns whether that went through.
 bool make_localtime_right() {
   try {
     repair_localtime_link();
