@@ -28,8 +28,8 @@ build() {
 }
 
 # Runs the calling script a second time, in a private mount namespace, and returns in that second run only. There /var
-# and /usr/share are fresh file systems, /var/tzdata.zi is the source of the machine's zone data, and paths relative to
-# the top of the tree still work, wherever that is.
+# and /usr/share are fresh file systems, /var/tzdata.zi is the source of the machine's zone data, $root is empty, and
+# paths relative to the top of the tree still work, wherever that is.
 enter_private_namespace() {
   local here user=()
   here=$(readlink /proc/self/ns/mnt)
@@ -44,6 +44,7 @@ kernel.apparmor_restrict_unprivileged_userns=0'
   mount -t tmpfs tmpfs /var
   cp /usr/share/zoneinfo/tzdata.zi /var/
   mount -t tmpfs tmpfs /usr/share
+  root=''
 }
 
 # zone_rule OFFSET NAME: the zone source on standard input, with Europe/Paris at that offset from UTC, the whole year,
@@ -62,20 +63,20 @@ following() {
   if [[ $last == z ]]; then echo "${1}a"; else echo "${1%?}$(tr a-y b-z <<<"$last")"; fi
 }
 
-# stage_system VERSION SCHEMA SOURCE: puts zone data compiled from SOURCE into the system partition.
+# stage_system VERSION SCHEMA SOURCE: puts zone data compiled from SOURCE into the system partition below $root.
 stage_system() {
-  rm -rf /usr/share/zoneinfo.default
-  mkdir -p /usr/share/zoneinfo.default /usr/share/icu
-  zic -d /usr/share/zoneinfo.default "$3"
-  echo "$1" >/usr/share/zoneinfo.default/+VERSION
-  echo "$2" >/usr/share/icu/icutzformat.txt
+  rm -rf "${root?}/usr/share/zoneinfo.default"
+  mkdir -p "$root/usr/share/zoneinfo.default" "$root/usr/share/icu"
+  zic -d "$root/usr/share/zoneinfo.default" "$3"
+  echo "$1" >"$root/usr/share/zoneinfo.default/+VERSION"
+  echo "$2" >"$root/usr/share/icu/icutzformat.txt"
 }
 
-# stage_dataset VERSION SCHEMA SOURCE: installs a dataset as an update installer does, its name last.
+# stage_dataset VERSION SCHEMA SOURCE: installs a dataset below $root as an update installer does, its name last.
 stage_dataset() {
   local dataset=/var/db/timezone/tz/$1
-  mkdir -p "$dataset/zoneinfo" "$dataset/icutz"
-  zic -d "$dataset/zoneinfo" "$3"
-  touch "$dataset/icutz/icutz$2.dat"
-  ln -sfn "$dataset" /var/db/timezone/tz_latest
+  mkdir -p "${root?}$dataset/zoneinfo" "$root$dataset/icutz"
+  zic -d "$root$dataset/zoneinfo" "$3"
+  touch "$root$dataset/icutz/icutz$2.dat"
+  ln -sfn "$dataset" "$root/var/db/timezone/tz_latest"
 }
