@@ -13,7 +13,7 @@ inline constexpr char dataset_root[] = "/var/db/timezone/tz/";  // one directory
 
 // The live links, through which programs reach the data.
 inline constexpr char zoneinfo_link[] = "/var/db/timezone/zoneinfo";    // the zone files of the live dataset
-inline constexpr char icu_link[] = "/var/db/timezone/icutz";            // its ICU data; no link for the system's
+inline constexpr char icu_link[] = "/var/db/timezone/icutz";            // its ICU data, if it was installed
 inline constexpr char localtime_link[] = "/var/db/timezone/localtime";  // one zone file, through zoneinfo_link
 
 // Notes to and from other software.

@@ -41,8 +41,8 @@ const boot_row table[] = {
     {"SameVersionAsSystemIsKept",
      "system 2021a 44l, dataset 2021a.1.0 44l, zoneinfo > @2021a.1.0/zoneinfo, icutz > @2021a.1.0/icutz", ""},
     {"WithoutAnySchema", "system 2021a -, zoneinfo > /usr/share/zoneinfo.default", ""},
-    {"OldMarkerAndLegacyPathsGo", system_live + "needs_cleanup = x, /var/db/icu /, /var/db/icutz > timezone/tz",
-     "- needs_cleanup, - /var/db/icu, - /var/db/icutz, icutz > timezone/tz"},
+    {"OldMarkerAndLegacyPathsGo", system_live + "needs_cleanup = x, /var/db/icu /, /var/db/icutz > icu",
+     "- needs_cleanup, - /var/db/icu, - /var/db/icutz, icutz > icu"},
     {"LegacyPathThatCannotGo", system_live + "/var/db/icu/x =, needs_cleanup/x =", ""},
 
     // The latest dataset is switched to.

@@ -1,8 +1,11 @@
 #include "fs/file_system.hpp"
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <cerrno>
+#include <functional>
+#include <utility>
 
 #include "sandbox.hpp"
 
@@ -27,6 +30,11 @@ TEST(FileSystem, FailuresWarnRaiseAndChangeNothing) {
        "remove: could not remove /var/db/timezone/x/y: Not a directory"},
       {"x =", [] { fs::read_symlink(at + "x"); }, EINVAL, "read_symlink: /var/db/timezone/x: Invalid argument"},
       {"x /", [] { fs::read_symlink(at + "x"); }, EINVAL, "read_symlink: /var/db/timezone/x: Invalid argument"},
+      {"x =", [] { fs::read_symlink(at + "x/y"); }, ENOTDIR, "read_symlink: /var/db/timezone/x/y: Not a directory"},
+      {"%s%n /", [] { fs::remove(at + "%s%n"); }, EISDIR,
+       "remove: could not remove /var/db/timezone/%s%n: Is a directory"},
+      {"x = text", [] { fs::create_symlink("t", at + "x"); }, EEXIST,
+       "create_symlink: from /var/db/timezone/x to t: File exists"},
       {"x > nowhere", [] { fs::create_symlink("t", at + "x"); }, EEXIST,
        "create_symlink: from /var/db/timezone/x to t: File exists"},
       {"", [] { fs::create_symlink("t", at + "no/x"); }, ENOENT,

@@ -18,16 +18,19 @@ struct repair {
 };
 
 void expect_repair(void (*operation)(), const repair& row) {
+  SCOPED_TRACE(row.situation);
   const auto before = read_disk();
   const auto result = observe(operation);
-  EXPECT_EQ(read_disk(), changed(before, row.changes)) << row.situation;
-  EXPECT_EQ(result.thrown, row.raised == 0 ? "" : std::to_string(row.raised)) << row.situation;
+  EXPECT_EQ(read_disk(), changed(before, row.changes));
+  EXPECT_EQ(result.thrown, row.raised == 0 ? "" : std::to_string(row.raised));
   expect_warnings(result.warnings, row.warnings);
 }
 
 TEST(Localtime, Repair) {
   const char* const fallback = "localtime > /var/db/timezone/zoneinfo/America/Los_Angeles";
   const std::string reset = "localtime link invalid; resetting to America/Los_Angeles";
+  const std::string created =
+      "create_symlink: from /var/db/timezone/localtime to /var/db/timezone/zoneinfo/America/Los_Angeles";
   const std::string correcting = "Correcting localtime link to /var/db/timezone/zoneinfo";
   const repair table[] = {
       {"localtime > /var/db/timezone/zoneinfo/Europe/Paris", ""},
@@ -47,7 +50,10 @@ TEST(Localtime, Repair) {
       {"localtime > /usr/share/zoneinf", fallback, {reset}},
       {"- localtime", fallback, {reset}},
       {"- localtime, - zoneinfo", fallback, {reset}},
-      {"localtime = TZif", fallback, {"read_symlink: /var/db/timezone/localtime: Invalid argument", reset}},
+      {"localtime = TZif",
+       fallback,
+       {"read_symlink: /var/db/timezone/localtime: Invalid argument", reset + ": Invalid argument"}},
+      {"- .", "", {reset, created + ": No such file or directory"}, ENOENT},
       {"localtime /", fallback, {"read_symlink: /var/db/timezone/localtime: Invalid argument", reset}},
       {"- localtime, localtime/x =",
        "",
@@ -64,6 +70,7 @@ TEST(Localtime, Repair) {
 
 TEST(LegacyIcuLink, Migration) {
   const std::string not_a_link = "read_symlink: /var/db/icutz: Invalid argument";
+  const std::string not_removed = "remove: could not remove /var/db/icutz: Is a directory";
   const std::string no_copy = "Could not migrate /var/db/icutz to /var/db/timezone/icutz";
   const repair table[] = {
       {"", ""},
@@ -77,11 +84,13 @@ TEST(LegacyIcuLink, Migration) {
       {"/var/db/icutz > timezone/tz, icutz > nowhere",
        "- /var/db/icutz",
        {"create_symlink: from /var/db/timezone/icutz to timezone/tz: File exists", no_copy}},
-      {"/var/db/icutz /",
-       "",
-       {not_a_link, no_copy, "remove: could not remove /var/db/icutz: Is a directory",
-        "Could not remove /var/db/icutz"}},
-      {"/var/db/icutz = file", "- /var/db/icutz", {not_a_link, no_copy}},
+      {"/var/db/icutz /", "", {not_a_link, no_copy, not_removed, "Could not remove /var/db/icutz"}},
+      {"/var/db/icutz = file", "- /var/db/icutz", {not_a_link, no_copy + ": Invalid argument"}},
+      {"/var/db/icutz /, icutz = file", "", {not_removed, "Could not remove /var/db/icutz: Is a directory"}},
+      {"/var/db/icutz > /usr, - .",
+       "- /var/db/icutz",
+       {"create_symlink: from /var/db/timezone/icutz to /usr: No such file or directory",
+        no_copy + ": No such file or directory"}},
   };
   for (const auto& row : table) {
     stage("dataset 2021b.1.0 44l, " + row.situation);

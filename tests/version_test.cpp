@@ -36,6 +36,7 @@ TEST(Version, Parses) {
       {"2020a.1.0", make(2020, "a", 1, 0)},
       {"2020ab.2", make(2020, "ab", 2, -1)},
       {"02020a.01", make(2020, "a", 1, -1)},
+      {"00000000002020a.00000000000000000001", make(2020, "a", 1, -1)},
       {"0z.00", make(0, "z", 0, -1)},
       {"2147483647a.2147483647.2147483647", make(2147483647, "a", 2147483647, 2147483647)},
   };
@@ -48,7 +49,7 @@ TEST(Version, Parses) {
 
 TEST(Version, BadTextWarnsTwiceAndResets) {
   for (const std::string text : {"", "2020", "abc", "2020A", "2020a.", "2020a.1.", "2020a.1.0.3", "2020a\n", " 2020a",
-                                 "2020a ", "-2020a", "2020a.-1", "2020a..1", "2020\xe9"}) {
+                                 "2020a ", "-2020a", "2020a.-1", "2020a..1", "%s%n", "2020\xe9"}) {
     auto parsed = make(1, "old", 2, 3);
     const auto result = sandbox::observe([&] { parse_version(parsed, text); });
     EXPECT_EQ(parsed, data_version()) << text;

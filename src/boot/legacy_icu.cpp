@@ -20,7 +20,7 @@ void migrate_legacy_icu_link() {
     try {
       fs::remove(paths::legacy_icu_link);
     } catch (...) {
-      // Nothing reads the old place any more, so what stays there does no harm.
+      // No program looks there any more; the next start tries again.
       ::warn("Could not remove %s", paths::legacy_icu_link);
     }
   }

@@ -15,7 +15,7 @@ namespace {
 constexpr char fallback_zone[] = "America/Los_Angeles";
 
 void replace_localtime_link(const std::string& target) {
-  // Unlike fs::remove this takes an empty directory away too. If it fails, so does the new link, which tells.
+  // Unlike fs::remove this takes an empty directory away too. If anything is left, the new link fails, which tells.
   std::remove(paths::localtime_link);
   fs::create_symlink(target, paths::localtime_link);
 }
@@ -47,7 +47,7 @@ void repair_localtime_link() {
       return;
     }
   } catch (...) {
-    // The failed call has warned; a device with some local time is better than one with none.
+    // Whatever failed, a device with some local time is better than one with none.
   }
   ::warn("localtime link invalid; resetting to %s", fallback_zone);
   replace_localtime_link(std::string(paths::zoneinfo_link) + "/" + fallback_zone);

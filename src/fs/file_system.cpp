@@ -31,7 +31,7 @@ bool path_exists(const std::string& path) noexcept { return ::access(path.c_str(
 
 std::string read_symlink(const std::string& path) {
   constexpr std::size_t longest_target = 1024;
-  char buffer[longest_target + 1];
+  char buffer[longest_target];
   const auto length = ::readlink(path.c_str(), buffer, longest_target);
   if (length < 0) {
     if (errno == ENOENT) {

@@ -2,7 +2,7 @@
 
 #include <string>
 
-/// The file-system operations that all else is made of. A failure that an operation does not tolerate is reported
+/// The file-system operations of the links and their data. A failure that an operation does not tolerate is reported
 /// and raised by `warn_and_raise`; the failed call has changed nothing on disk.
 namespace fs {
 
@@ -14,7 +14,7 @@ namespace fs {
 
 /// Deletes a file or a symbolic link itself, never a directory. A path that does not exist counts as deleted.
 ///
-/// Throws errno: EISDIR for a directory, otherwise as `unlink` sets it.
+/// Throws errno as `unlink` sets it: EISDIR for a directory.
 void remove(const std::string& path);
 
 /// Returns whether the path exists once every link is followed: false for a dangling link.
@@ -23,13 +23,13 @@ bool path_exists(const std::string& path) noexcept;
 /// Returns the bytes that the link stores, cut to the first 1024; empty when nothing stands at `path`.
 /// The target itself need not exist.
 ///
-/// Throws errno: EINVAL for anything but a link, otherwise as `readlink` sets it.
+/// Throws errno as `readlink` sets it: EINVAL for anything but a link.
 std::string read_symlink(const std::string& path);
 
 /// Makes a link at `link` that holds the text `target`, which is not examined.
 ///
-/// Throws errno: EEXIST when anything, a dangling link included, stands at `link`, and leaves that as it was;
-/// otherwise as `symlink` sets it.
+/// Throws errno as `symlink` sets it: EEXIST when anything, even a dangling link, stands at `link`; that stays as it
+/// was.
 void create_symlink(const std::string& target, const std::string& link);
 
 /// Returns the first word of a text file: leading white space is skipped, the word ends at the next white space or

@@ -70,7 +70,7 @@ data_version::data_version(const std::string& text) { parse_version(*this, text)
 void parse_version(data_version& version, const std::string& text) {
   const auto groups = match(text);
   if (!groups) {
-    ::warn("Cannot parse version string %s, results.size() = %d", text.c_str(), 0);
+    ::warn("Cannot parse version string %s, results.size() = 0", text.c_str());
     ::warn("Cannot parse version string %s", text.c_str());
     version = {};
     return;
