@@ -20,9 +20,8 @@ struct boot_row {
   friend void PrintTo(const boot_row& row, std::ostream* out) { *out << row.name; }
 };
 
-const std::string system_live = "system 2021a 44l, zoneinfo > /usr/share/zoneinfo.default, ";
-const std::string installed_live =
-    "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz, ";
+const std::string system_live = "system 2021a 44l, live system, ";
+const std::string installed_live = "system 2021a 44l, dataset 2021b.1.0 44l, live 2021b.1.0, ";
 
 const char* const invalid = "Invalid current symlinks; resetting to system partition";
 const char* const incompatible = "Symlink points at data incompatible with installed system";
@@ -38,141 +37,130 @@ const boot_row table[] = {
     // The current dataset is kept.
     {"Quiet", system_live, ""},
     {"QuietInstalled", installed_live, ""},
-    {"SameVersionAsSystemIsKept",
-     "system 2021a 44l, dataset 2021a.1.0 44l, zoneinfo > @2021a.1.0/zoneinfo, icutz > @2021a.1.0/icutz", ""},
-    {"WithoutAnySchema", "system 2021a -, zoneinfo > /usr/share/zoneinfo.default", ""},
+    {"SameVersionAsSystemIsKept", "system 2021a 44l, dataset 2021a.1.0 44l, live 2021a.1.0", ""},
+    {"WithoutAnySchema", "system 2021a -, live system", ""},
     {"OldMarkerAndLegacyPathsGo", system_live + "needs_cleanup = x, /var/db/icu /, /var/db/icutz > icu",
      "- needs_cleanup, - /var/db/icu, - /var/db/icutz, icutz > icu"},
     {"LegacyPathThatCannotGo", system_live + "/var/db/icu/x =, needs_cleanup/x =", ""},
 
     // The latest dataset is switched to.
-    {"SwitchFromSystem", system_live + "dataset 2021b.1.0 44l, tz_latest > @2021b.1.0",
-     "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz, TZVersionDiffRecord = 2021a.1.0_2021b.1.0"},
+    {"SwitchFromSystem", system_live + "dataset 2021b.1.0 44l, latest 2021b.1.0",
+     "live 2021b.1.0, record 2021a.1.0_2021b.1.0"},
     {"SwitchFromInstalled",
-     installed_live + "dataset 2022a.1.0 44l, tz_latest > @2022a.1.0, TZVersionDiffRecord = a longer and older record",
-     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
-     "TZVersionDiffRecord = 2021b.1.0_2022a.1.0"},
+     installed_live + "dataset 2022a.1.0 44l, latest 2022a.1.0, record a longer and older record",
+     "live 2022a.1.0, marker, record 2021b.1.0_2022a.1.0"},
     {"SwitchFromInstalledOfTheSystemsVersion",
-     "system 2021a 44l, dataset 2021a.1.0 44l, zoneinfo > @2021a.1.0/zoneinfo, dataset 2022a.1.0 44l, "
-     "tz_latest > @2022a.1.0",
-     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
-     "TZVersionDiffRecord = 2021a.1.0_2022a.1.0"},
-    {"SwitchWithoutARecord", system_live + "dataset 2021b.1.0 44l, tz_latest > @2021b.1.0, TZVersionDiffRecord /",
-     "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz"},
+     "system 2021a 44l, dataset 2021a.1.0 44l, live 2021a.1.0, dataset 2022a.1.0 44l, latest 2022a.1.0",
+     "live 2022a.1.0, marker, record 2021a.1.0_2022a.1.0"},
+    {"SwitchWithoutARecord", system_live + "dataset 2021b.1.0 44l, latest 2021b.1.0, TZVersionDiffRecord /",
+     "live 2021b.1.0"},
     {"SwitchWithoutAMarker",
-     installed_live + "dataset 2022a.1.0 44l, tz_latest > @2022a.1.0, needs_cleanup/x =",
-     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, TZVersionDiffRecord = 2021b.1.0_2022a.1.0",
+     installed_live + "dataset 2022a.1.0 44l, latest 2022a.1.0, needs_cleanup/x =",
+     "live 2022a.1.0, record 2021b.1.0_2022a.1.0",
      {"Cannot touch file /var/db/timezone/needs_cleanup: Is a directory"}},
 
     // The latest dataset is refused.
-    {"LatestIsLiveAlready", installed_live + "tz_latest > @2021b.1.0", "", {refused("2021b.1.0", "2021b.1.0")}},
+    {"LatestIsLiveAlready", installed_live + "latest 2021b.1.0", "", {refused("2021b.1.0", "2021b.1.0")}},
     {"LatestIsOlder",
-     installed_live + "dataset 2021a.9.0 44l, tz_latest > @2021a.9.0",
+     installed_live + "dataset 2021a.9.0 44l, latest 2021a.9.0",
      "",
      {refused("2021a.9.0", "2021b.1.0")}},
     {"LatestIsOfAnotherSchema",
-     system_live + "dataset 2021b.1.0 46l, tz_latest > @2021b.1.0",
+     system_live + "dataset 2021b.1.0 46l, latest 2021b.1.0",
      "",
      {refused("2021b.1.0", "2021a.1.0")}},
     {"LatestIsMissing",
-     system_live + "tz_latest > @2021b.1.0",
+     system_live + "latest 2021b.1.0",
      "",
      {"No ICU schema found for /var/db/timezone/tz/2021b.1.0", refused("2021b.1.0", "2021a.1.0")}},
     {"LatestHasNoVersion",
-     system_live + "dataset new -, tz_latest > @new",
+     system_live + "dataset new -, latest new",
      "",
      {"Cannot parse version string new, results.size() = 0", "Cannot parse version string new",
       "No ICU schema found for /var/db/timezone/tz/new", refused("new", "2021a.1.0")}},
 
     // The current dataset is rejected.
-    {"SystemIsNewer",
-     "system 2022a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz",
-     "zoneinfo > /usr/share/zoneinfo.default, - icutz, needs_cleanup =",
-     {incompatible}},
+    {"SystemIsNewer", "system 2022a 44l, dataset 2021b.1.0 44l, live 2021b.1.0", "live system, marker", {incompatible}},
     {"SystemIsNewerThanCurrentAndLatest",
-     "system 2022a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, tz_latest > @2021b.1.0",
-     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     "system 2022a 44l, dataset 2021b.1.0 44l, live 2021b.1.0, latest 2021b.1.0",
+     "live system, marker",
      {incompatible, refused("2021b.1.0", "2021b.1.0")}},
     {"SystemIsOfAnotherSchema",
-     "system 2021a 46l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz",
-     "zoneinfo > /usr/share/zoneinfo.default, - icutz, needs_cleanup =",
+     "system 2021a 46l, dataset 2021b.1.0 44l, live 2021b.1.0",
+     "live system, marker",
      {incompatible}},
     {"LatestIsOlderThanSystemButNewerThanTheRejected",
-     "system 2022z 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, "
-     "tz_latest > @2022a.1.0",
-     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
-     "TZVersionDiffRecord = 2022z.1.0_2022a.1.0",
+     "system 2022z 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, live 2021b.1.0, latest 2022a.1.0",
+     "live 2022a.1.0, marker, record 2022z.1.0_2022a.1.0",
      {incompatible}},
 
     {"CurrentIsMissing",
-     "system 2021a 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz",
-     "zoneinfo > /usr/share/zoneinfo.default, - icutz, needs_cleanup =",
+     "system 2021a 44l, live 2021b.1.0",
+     "live system, marker",
      {"No ICU schema found for /var/db/timezone/tz/2021b.1.0", incompatible}},
     {"LatestFitsTheSystemUnlikeTheRejected",
-     "system 2021a 46l, dataset 2021b.1.0 44l, dataset 2022a.1.0 46l, zoneinfo > @2021b.1.0/zoneinfo, "
-     "tz_latest > @2022a.1.0, needs_cleanup/x =",
-     "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, TZVersionDiffRecord = 2021a.1.0_2022a.1.0",
+     "system 2021a 46l, dataset 2021b.1.0 44l, dataset 2022a.1.0 46l, live 2021b.1.0, latest 2022a.1.0, "
+     "needs_cleanup/x =",
+     "live 2022a.1.0, record 2021a.1.0_2022a.1.0",
      {incompatible, "Cannot touch file /var/db/timezone/needs_cleanup: Is a directory"}},
     {"LatestFitsTheRejectedUnlikeTheSystem",
-     "system 2021a 46l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, "
-     "tz_latest > @2022a.1.0",
-     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     "system 2021a 46l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, live 2021b.1.0, latest 2022a.1.0",
+     "live system, marker",
      {incompatible, refused("2022a.1.0", "2021b.1.0")}},
     {"RejectionIsToldBeforeTheReset",
-     "system 2022a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz /",
-     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     "system 2022a 44l, dataset 2021b.1.0 44l, live 2021b.1.0, icutz /",
+     "zoneinfo > /usr/share/zoneinfo.default, marker",
      {incompatible, "remove: could not remove /var/db/timezone/icutz: Is a directory",
       "unlink of ICU softlink failed"}},
 
     // The live zoneinfo link is invalid.
-    {"FirstBoot", "system 2021a 44l", "zoneinfo > /usr/share/zoneinfo.default", {"Bad zoneinfo link ", invalid}},
+    {"FirstBoot", "system 2021a 44l", "live system", {"Bad zoneinfo link : No such file or directory", invalid}},
     {"InvalidLinkAndLatestAccepted",
-     "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > anywhere, needs_cleanup =, tz_latest > @2021b.1.0",
-     "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz, - needs_cleanup, "
-     "TZVersionDiffRecord = 2021a.1.0_2021b.1.0",
+     "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > anywhere, marker, latest 2021b.1.0",
+     "live 2021b.1.0, - needs_cleanup, record 2021a.1.0_2021b.1.0",
      {"Bad zoneinfo link anywhere", invalid}},
     {"InvalidLinkAndLatestRefused",
-     "system 2021a 44l, dataset 2020a.1.0 44l, zoneinfo = file, icutz > anywhere, tz_latest > @2020a.1.0",
-     "zoneinfo > /usr/share/zoneinfo.default, - icutz",
+     "system 2021a 44l, dataset 2020a.1.0 44l, zoneinfo = file, icutz > anywhere, latest 2020a.1.0",
+     "live system",
      {"read_symlink: /var/db/timezone/zoneinfo: Invalid argument", invalid, refused("2020a.1.0", "2021a.1.0")}},
 
     // The fallback.
     {"LatestLiesElsewhere",
      installed_live + "tz_latest > /elsewhere",
-     "zoneinfo > /usr/share/zoneinfo.default, - icutz",
+     "live system",
      {"vrel_dataset::create_components: bad path /elsewhere", unable}},
     {"LatestIsNoLinkAndIsReadBeforeZoneinfo",
      "system 2021a 44l, zoneinfo > anywhere, tz_latest =",
-     "zoneinfo > /usr/share/zoneinfo.default",
+     "live system",
      {"read_symlink: /var/db/timezone/tz_latest: Invalid argument", unable}},
     {"LatestVersionIsTooLarge",
-     installed_live + "dataset 9999999999a 44l, tz_latest > @9999999999a",
-     "zoneinfo > /usr/share/zoneinfo.default, - icutz",
+     installed_live + "dataset 9999999999a 44l, latest 9999999999a",
+     "live system",
      {unable}},
     {"SwitchBreaksOffHalfWay",
-     system_live + "dataset 2021b.1.0 44l, icutz /, tz_latest > @2021b.1.0, TZVersionDiffRecord = old",
+     system_live + "dataset 2021b.1.0 44l, icutz /, latest 2021b.1.0, record old",
      "",
      {"remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed",
       "create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2021b.1.0/icutz: File exists", unable,
       "remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed"}},
     {"InstalledSwitchBreaksOffHalfWay",
-     "system 2021a 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, icutz /, "
-     "tz_latest > @2022a.1.0, needs_cleanup =",
+     "system 2021a 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, live 2021b.1.0, icutz /, latest 2022a.1.0, "
+     "marker",
      "zoneinfo > /usr/share/zoneinfo.default, - needs_cleanup",
      {"remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed",
       "create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2022a.1.0/icutz: File exists", unable,
       "remove: could not remove /var/db/timezone/icutz: Is a directory", "unlink of ICU softlink failed"}},
     {"FallbackKeepsTheMarkerOfTheRejection",
-     "system 2022a 44l, dataset 2021b.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, tz_latest > /elsewhere",
-     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =",
+     "system 2022a 44l, dataset 2021b.1.0 44l, live 2021b.1.0, tz_latest > /elsewhere",
+     "live system, marker",
      {incompatible, "vrel_dataset::create_components: bad path /elsewhere", unable}},
     {"CurrentVersionIsTooLarge",
-     "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > @9999999999a/zoneinfo, tz_latest > @2021b.1.0",
-     "zoneinfo > /usr/share/zoneinfo.default",
+     "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > @9999999999a/zoneinfo, latest 2021b.1.0",
+     "live system",
      {unable}},
-    {"SystemVersionIsTooLarge", "system 9999999999a 44l, zoneinfo > /usr/share/zoneinfo.default", "", {unable}, 1},
+    {"SystemVersionIsTooLarge", "system 9999999999a 44l, live system", "", {unable}, 1},
     {"SystemWithoutData",
-     "zoneinfo > /usr/share/zoneinfo.default",
+     "live system",
      "",
      {"Cannot parse version string .1.0, results.size() = 0", "Cannot parse version string .1.0",
       "Cannot parse version string .1.0, results.size() = 0", "Cannot parse version string .1.0"}},
@@ -196,16 +184,14 @@ const boot_row table[] = {
 
     // The local time link is repaired after the switch, in the data that is live by then.
     {"LocaltimeZoneCameWithTheUpdate",
-     system_live + "dataset 2021b.1.0 44l, tz/2021b.1.0/zoneinfo/Mars/Olympus = TZif, tz_latest > @2021b.1.0, "
-                   "localtime > /usr/share/zoneinfo/Mars/Olympus",
-     "zoneinfo > @2021b.1.0/zoneinfo, icutz > @2021b.1.0/icutz, TZVersionDiffRecord = 2021a.1.0_2021b.1.0, "
-     "localtime > /var/db/timezone/zoneinfo/Mars/Olympus",
+     system_live + "dataset 2021b.1.0 44l, tz/2021b.1.0/zoneinfo/Mars/Olympus = TZif, latest 2021b.1.0, localtime > "
+                   "/usr/share/zoneinfo/Mars/Olympus",
+     "live 2021b.1.0, record 2021a.1.0_2021b.1.0, localtime > /var/db/timezone/zoneinfo/Mars/Olympus",
      {"Correcting localtime link to /var/db/timezone/zoneinfo/Mars/Olympus"}},
     {"LocaltimeZoneWentWithTheUpdate",
-     "system 2022a 44l, dataset 2021b.1.0 44l, tz/2021b.1.0/zoneinfo/Mars/Olympus = TZif, "
-     "zoneinfo > @2021b.1.0/zoneinfo, localtime > /usr/share/zoneinfo/Mars/Olympus",
-     "zoneinfo > /usr/share/zoneinfo.default, needs_cleanup =, "
-     "localtime > /var/db/timezone/zoneinfo/America/Los_Angeles",
+     "system 2022a 44l, dataset 2021b.1.0 44l, tz/2021b.1.0/zoneinfo/Mars/Olympus = TZif, live 2021b.1.0, localtime > "
+     "/usr/share/zoneinfo/Mars/Olympus",
+     "live system, marker, localtime > /var/db/timezone/zoneinfo/America/Los_Angeles",
      {incompatible, "Correcting localtime link to /var/db/timezone/zoneinfo/Mars/Olympus",
       "localtime link invalid; resetting to America/Los_Angeles"}},
 };

@@ -6,6 +6,7 @@
 #include <sched.h>
 #include <sys/mman.h>
 #include <sys/mount.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -17,6 +18,7 @@
 #include <exception>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <sstream>
 
 #include "boot/reconcile.hpp"
@@ -72,7 +74,35 @@ std::vector<std::string> split(std::string_view text, std::string_view separator
   return parts;
 }
 
-/// The path and value of a statement of the last four kinds; the value is empty for "nothing at PATH".
+/// The statements on paths that a shorter one stands for.
+std::vector<std::string> in_full(const std::string& statement) {
+  const auto space = std::min(statement.find(' '), statement.size());
+  const auto kind = statement.substr(0, space);
+  const auto rest = statement.substr(std::min(space + 1, statement.size()));
+  if (statement == "live system") {
+    return {"zoneinfo > /usr/share/zoneinfo.default", "- icutz"};
+  }
+  if (kind == "live") {
+    return {"zoneinfo > @" + rest + "/zoneinfo", "icutz > @" + rest + "/icutz"};
+  }
+  if (kind == "latest") {
+    return {"tz_latest > @" + rest};
+  }
+  if (kind == "marker") {
+    return {"needs_cleanup ="};
+  }
+  return {kind == "record" ? "TZVersionDiffRecord = " + rest : statement};
+}
+
+std::vector<std::string> path_statements(std::string_view statements) {
+  std::vector<std::string> all;
+  for (const auto& statement : split(statements, ", ")) {
+    std::ranges::move(in_full(statement), std::back_inserter(all));
+  }
+  return all;
+}
+
+/// The path and value of a statement on a path; the value is empty for "nothing at PATH".
 disk::value_type entry_of(const std::string& statement) {
   const filesystem::path base(state_directory);
   if (statement.starts_with("- ")) {
@@ -197,6 +227,7 @@ void enter() {
   const std::intptr_t terminal = ::dup(STDERR_FILENO);
   __sanitizer_set_report_fd(reinterpret_cast<void*>(terminal));  // NOLINT(performance-no-int-to-ptr)
   program_invocation_short_name = const_cast<char*>(program);
+  ::umask(022);
   enter_namespaces();
   if (::mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
     give_up("cannot make the mounts private", "The tests must not touch the machine's own paths, so they end here.");
@@ -217,7 +248,7 @@ void stage(std::string_view situation) {
   }
   filesystem::create_directories("/var/db/timezone/tz");
   make_entry("/var/db/timezone/localtime", "> /var/db/timezone/zoneinfo/Europe/Paris");
-  for (const auto& statement : split(situation, ", ")) {
+  for (const auto& statement : path_statements(situation)) {
     if (!stage_data(statement)) {
       const auto [path, value] = entry_of(statement);
       filesystem::remove_all(path);
@@ -241,7 +272,7 @@ disk read_disk() {
 }
 
 disk changed(disk before, std::string_view statements) {
-  for (const auto& statement : split(statements, ", ")) {
+  for (const auto& statement : path_statements(statements)) {
     const auto [path, value] = entry_of(statement);
     if (value.empty()) {
       before.erase(path);

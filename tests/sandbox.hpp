@@ -11,6 +11,11 @@
 /// A situation is a list of statements, separated by ", ". Their paths are relative to /var/db/timezone:
 ///   system VERSION SCHEMA    the system partition's data; "-" leaves the version or the schema file out
 ///   dataset VERSION SCHEMA   an installed dataset; "-" leaves the ICU data file out
+///   live system              the zoneinfo link leads to the system partition, no icutz link
+///   live VERSION             both links lead to the dataset
+///   latest VERSION           tz_latest leads to the dataset
+///   marker                   an empty needs_cleanup
+///   record TEXT              TZVersionDiffRecord holds the text
 ///   PATH > TARGET            a link; "@" at the front of a target stands for /var/db/timezone/tz/
 ///   PATH = TEXT              a file
 ///   PATH /                   a directory
@@ -28,7 +33,7 @@ void stage(std::string_view situation);
 using disk = std::map<std::string, std::string>;
 disk read_disk();
 
-/// What `before` becomes when statements of the last four kinds are carried out.
+/// What `before` becomes when statements, but for the first two kinds, are carried out.
 disk changed(disk before, std::string_view statements);
 
 struct outcome {

@@ -17,11 +17,9 @@ namespace {
 using sandbox::changed, sandbox::expect_warnings, sandbox::read_disk, sandbox::run_release_binary, sandbox::stage;
 
 const char* const switch_from_installed =
-    "system 2021a 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, zoneinfo > @2021b.1.0/zoneinfo, "
-    "icutz > @2021b.1.0/icutz, tz_latest > @2022a.1.0, localtime =";
+    "system 2021a 44l, dataset 2021b.1.0 44l, dataset 2022a.1.0 44l, live 2021b.1.0, latest 2022a.1.0, localtime =";
 const char* const switched =
-    "zoneinfo > @2022a.1.0/zoneinfo, icutz > @2022a.1.0/icutz, needs_cleanup =, "
-    "TZVersionDiffRecord = 2021b.1.0_2022a.1.0, localtime > /var/db/timezone/zoneinfo/America/Los_Angeles";
+    "live 2022a.1.0, marker, record 2021b.1.0_2022a.1.0, localtime > /var/db/timezone/zoneinfo/America/Los_Angeles";
 
 void expect_switch(const std::function<void()>& prepare, const std::string& surrounding) {
   stage(switch_from_installed);
@@ -106,14 +104,11 @@ TEST(Surroundings, AReadOnlyStateDirectoryIsToldAndKept) {
                    "create_symlink: from /var/db/timezone/zoneinfo to /usr/share/zoneinfo.default",
                    "read_symlink: /var/db/timezone/localtime: Invalid argument",
                    "localtime link invalid; resetting to America/Los_Angeles: Invalid argument",
-                   "create_symlink: from /var/db/timezone/localtime to "
-                   "/var/db/timezone/zoneinfo/America/Los_Angeles"});
+                   "create_symlink: from /var/db/timezone/localtime to /var/db/timezone/zoneinfo/America/Los_Angeles"});
 }
 
 TEST(Surroundings, AFullStateDirectoryIsToldAndTheSystemsDataStays) {
-  stage(
-      "system 2021a 44l, dataset 2021b.1.0 44l, zoneinfo > /usr/share/zoneinfo.default, tz_latest > @2021b.1.0, "
-      "- localtime");
+  stage("system 2021a 44l, dataset 2021b.1.0 44l, live system, latest 2021b.1.0, - localtime");
   const auto before = read_disk();
   struct statvfs room {};
   ASSERT_EQ(::statvfs("/var", &room), 0);
@@ -122,13 +117,13 @@ TEST(Surroundings, AFullStateDirectoryIsToldAndTheSystemsDataStays) {
   remount_var(0, "nr_inodes=0");
   EXPECT_EQ(result.status, 1);
   EXPECT_EQ(read_disk(), before);
-  expect_warnings(result.warnings,
-                  {"create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2021b.1.0/icutz: "
-                   "No space left on device",
-                   "Unable to locate data; resetting to system partition",
-                   "localtime link invalid; resetting to America/Los_Angeles",
-                   "create_symlink: from /var/db/timezone/localtime to /var/db/timezone/zoneinfo/America/Los_Angeles: "
-                   "No space left on device"});
+  expect_warnings(
+      result.warnings,
+      {"create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2021b.1.0/icutz: No space left on device",
+       "Unable to locate data; resetting to system partition",
+       "localtime link invalid; resetting to America/Los_Angeles",
+       "create_symlink: from /var/db/timezone/localtime to /var/db/timezone/zoneinfo/America/Los_Angeles: No space "
+       "left on device"});
 }
 
 TEST(Surroundings, AVersionOfSixteenMegabytesDoesNotStopTheLocalTimeRepair) {
@@ -140,8 +135,7 @@ TEST(Surroundings, AVersionOfSixteenMegabytesDoesNotStopTheLocalTimeRepair) {
       {"2021" + std::string(length, 'a'), 0},
   };
   for (const auto& [version, status] : table) {
-    stage("system - 44l, zoneinfo > /usr/share/zoneinfo.default, - localtime, /usr/share/zoneinfo.default/+VERSION = " +
-          version);
+    stage("system - 44l, live system, - localtime, /usr/share/zoneinfo.default/+VERSION = " + version);
     const auto result = run_release_binary([] { ::dup2(::open("/dev/null", O_WRONLY), STDERR_FILENO); });
     EXPECT_EQ(result.status, status) << version.substr(0, 8);
     EXPECT_EQ(read_disk().at("/var/db/timezone/localtime"), "> /var/db/timezone/zoneinfo/America/Los_Angeles");

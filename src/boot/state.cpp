@@ -23,10 +23,10 @@ bool touch(const char* path) noexcept {
   if (descriptor < 0) {
     return false;
   }
-  struct stat status;
-  const bool usable = ::fstat(descriptor, &status) == 0;
+  struct stat status;  // Not looked at: that it can be had shows that the file is there.
+  const bool is_there = ::fstat(descriptor, &status) == 0;
   const bool closed = ::close(descriptor) == 0;
-  return usable && closed;
+  return is_there && closed;
 }
 
 }  // namespace
@@ -39,7 +39,7 @@ void prepare_state_directories() noexcept {
 void set_protection_class(const char* path) noexcept {
   const int descriptor = ::open(path, O_RDONLY | O_CLOEXEC);
   if (descriptor < 0) {
-    // A device that has no dataset yet may have no directory either, and the data is of use in any class.
+    // Whatever is wrong here shows when the links are read, and the data is of use in any class.
     return;
   }
   platform::set_protection_class(descriptor, protection_class);
@@ -52,7 +52,7 @@ std::string current_dataset_path() { return dataset_path_from_link(fs::read_syml
 
 std::string dataset_path_from_link(const std::string& target) {
   constexpr std::string_view root = paths::dataset_root;
-  if (target.size() > root.size() && target.starts_with(root)) {
+  if (target.starts_with(root)) {
     const auto last_slash = target.rfind('/');
     // At least one byte must stand between the root and that slash: the name of the dataset.
     if (last_slash > root.size()) {
@@ -67,7 +67,7 @@ std::string dataset_path_from_link(const std::string& target) {
 
 void mark_needs_cleanup() noexcept {
   if (!touch(paths::needs_cleanup)) {
-    // The clean-up job then finds out at a later switch; the data that is live is right all the same.
+    // The data that is live is right all the same; only the clean-up has to wait.
     ::warn("Cannot touch file %s", paths::needs_cleanup);
   }
 }

@@ -15,17 +15,17 @@ void set_protection_class(const char* path) noexcept;
 
 /// Returns what "tz_latest" holds, unexamined: the path of the newest installed dataset. Empty when there is no link.
 ///
-/// Throws errno, after a warning, when something other than a link stands there.
+/// Throws what `fs::read_symlink` throws.
 std::string latest_dataset_path();
 
 /// Returns the path of the dataset that the live zoneinfo link points into, empty for the system partition.
 ///
-/// Throws, after a warning, what `dataset_path_from_link` throws, for a missing link too, and errno when something
-/// other than a link stands there.
+/// Throws what `fs::read_symlink` throws, and what `dataset_path_from_link` throws, for a missing link too.
 std::string current_dataset_path();
 
-/// Returns the path of the dataset that the zoneinfo link's `target` lies in: for a target below
-/// "/var/db/timezone/tz/" all before the last "/", for the system partition's zone files the empty string.
+/// Returns the path of the dataset that the zoneinfo link's `target` lies in: all before the last "/" when the target
+/// begins with "/var/db/timezone/tz/" and at least one byte stands between that and the last "/"; the empty string for
+/// the system partition's zone files.
 ///
 /// Throws the `int` -1, after a warning, for every other target.
 std::string dataset_path_from_link(const std::string& target);

@@ -79,7 +79,8 @@ void vrel_icu::activate() const {
     fs::remove(paths::icu_link);
     fs::remove(paths::legacy_icu_link);
   } catch (...) {
-    // The system's data needs no link; for installed data the new link fails if the old one is still there.
+    // The system's data needs no link. For installed data the new link fails if the old one is still there, and what
+    // is left at the place of earlier releases is in nobody's way.
     ::warn("unlink of ICU softlink failed");
   }
   if (!dataset_path.empty()) {

@@ -22,8 +22,7 @@ class vrel_icu final : public vrel_dataset_component {
   /// Returns whether `other` is ICU data of the same schema, an empty one included. Warns when it is no ICU data.
   bool compatible_schema(const vrel_dataset_component* other) const override;
 
-  /// Also removes the link at its place in earlier releases. For the system's data no link is made: programs find
-  /// that without one.
+  /// Also removes the link at its place in earlier releases. For the system's data no link is made.
   void activate() const override;
 
  private:
