@@ -289,12 +289,23 @@ outcome observe(const std::function<void()>& action) {
   try {
     action();
   } catch (int raised) {
-    result.thrown = std::to_string(raised);
+    result.thrown = raised > 0 ? std::strerror(raised) : std::to_string(raised);
   } catch (const std::exception& error) {
     result.thrown = error.what();
   }
   result.warnings = warnings_in(captured.text());
   return result;
+}
+
+void check(const expectation& expected, const std::function<outcome()>& run) {
+  SCOPED_TRACE(expected.situation);
+  stage(expected.situation);
+  const auto before = read_disk();
+  const auto result = run();
+  EXPECT_EQ(read_disk(), changed(before, expected.changes));
+  EXPECT_EQ(result.status, expected.status);
+  EXPECT_EQ(result.thrown, expected.thrown);
+  expect_warnings(result.warnings, expected.warnings);
 }
 
 outcome run_pass() {

@@ -38,11 +38,23 @@ disk changed(disk before, std::string_view statements);
 
 struct outcome {
   int status = 0;                     // what a pass returned
-  std::string thrown;                 // an int in decimal, a standard exception's text, or empty
+  std::string thrown;                 // empty, a standard exception's text, or that of an int taken for errno
   std::vector<std::string> warnings;  // without the program's name
 };
 
 [[nodiscard]] outcome observe(const std::function<void()>& action);
+
+/// A situation, and what an action makes of it.
+struct expectation {
+  std::string situation;
+  std::string changes;  // statements
+  std::vector<std::string> warnings = {};
+  std::string thrown = {};
+  int status = 0;
+};
+
+/// Stages the situation, runs the action and fails the test unless all is as expected.
+void check(const expectation& expected, const std::function<outcome()>& run);
 
 /// One pass in this process.
 outcome run_pass();
