@@ -20,6 +20,7 @@
 #include <fstream>
 #include <iterator>
 #include <sstream>
+#include <stdexcept>
 
 #include "boot/reconcile.hpp"
 
