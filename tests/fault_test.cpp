@@ -4,7 +4,6 @@
 #include <fts.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
-#include <sys/uio.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
