@@ -2,7 +2,8 @@
 # shellcheck shell=bash
 set -euo pipefail
 script=$(realpath "$0")
-cd "$(dirname "${BASH_SOURCE[0]}")/.."
+cd "$(dirname "$(realpath "${BASH_SOURCE[0]}")")/.."
+PATH=$PATH:/usr/sbin:/sbin # where zic and mount helpers are, and an ordinary user does not look
 
 die() {
   printf '%s: %s\n' "${script##*/}" "$*" >&2
@@ -27,18 +28,27 @@ build() {
   cmake --build --preset "$1"
 }
 
+# Whether this is the second run that enter_private_namespace starts. Its word alone is not taken for that: the mount
+# namespace must really be another than that of the parent process, which stays outside.
+in_private_namespace() {
+  local here outside
+  here=$(readlink /proc/self/ns/mnt)
+  outside=$(readlink "/proc/$PPID/ns/mnt") || outside=${TZRECONCILE_OUTSIDE-} # not to be seen from a user namespace
+  [[ ${TZRECONCILE_OUTSIDE-} == "$outside" && $outside != "$here" ]]
+}
+
 # Runs the calling script a second time, in a private mount namespace, and returns in that second run only. There /var
 # and /usr/share are fresh file systems, /var/tzdata.zi is the source of the machine's zone data, $root is empty, and
 # paths relative to the top of the tree still work, wherever that is.
 enter_private_namespace() {
-  local here user=()
-  here=$(readlink /proc/self/ns/mnt)
-  if [[ ${TZRECONCILE_OUTSIDE:-$here} == "$here" ]]; then
+  local user=()
+  if ! in_private_namespace; then
     ((EUID == 0)) || user=(--map-root-user)
     unshare --mount "${user[@]}" true || die 'no private mount namespace: run this as root, or allow user namespaces
 with sysctl user.max_user_namespaces=10000 and, where they exist, kernel.unprivileged_userns_clone=1 and
 kernel.apparmor_restrict_unprivileged_userns=0'
-    export TZRECONCILE_OUTSIDE=$here
+    TZRECONCILE_OUTSIDE=$(readlink /proc/self/ns/mnt)
+    export TZRECONCILE_OUTSIDE
     exec unshare --mount --propagation private "${user[@]}" "$script"
   fi
   mount -t tmpfs tmpfs /var

@@ -17,6 +17,16 @@ namespace {
 constexpr int protection_class = 4;
 constexpr int rejected_link = -1;
 
+void set_protection_class(const char* path) noexcept {
+  const int descriptor = ::open(path, O_RDONLY | O_CLOEXEC);
+  if (descriptor < 0) {
+    // Whatever is wrong here shows when the links are read, and the data is of use in any class.
+    return;
+  }
+  platform::set_protection_class(descriptor, protection_class);
+  ::close(descriptor);
+}
+
 /// Makes the file unless it exists. Returns whether every call succeeded; errno is that of the last that did not.
 bool touch(const char* path) noexcept {
   const int descriptor = platform::open_protected(path, O_RDWR | O_CREAT, protection_class, 0666);
@@ -34,16 +44,6 @@ bool touch(const char* path) noexcept {
 void prepare_state_directories() noexcept {
   set_protection_class(paths::state_directory);
   set_protection_class(paths::dataset_root);
-}
-
-void set_protection_class(const char* path) noexcept {
-  const int descriptor = ::open(path, O_RDONLY | O_CLOEXEC);
-  if (descriptor < 0) {
-    // Whatever is wrong here shows when the links are read, and the data is of use in any class.
-    return;
-  }
-  platform::set_protection_class(descriptor, protection_class);
-  ::close(descriptor);
 }
 
 std::string latest_dataset_path() { return fs::read_symlink(paths::latest_link); }

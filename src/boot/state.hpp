@@ -10,9 +10,6 @@ namespace boot {
 /// A directory that is missing or cannot be opened is passed over in silence; none is made.
 void prepare_state_directories() noexcept;
 
-/// Does the same for one directory.
-void set_protection_class(const char* path) noexcept;
-
 /// Returns what "tz_latest" holds, unexamined: the path of the newest installed dataset. Empty when there is no link.
 ///
 /// Throws what `fs::read_symlink` throws.
