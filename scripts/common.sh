@@ -3,6 +3,7 @@
 set -euo pipefail
 script=$(realpath "$0")
 cd "$(dirname "$(realpath "${BASH_SOURCE[0]}")")/.."
+umask 022 # what is staged and packaged is for all to read
 PATH=$PATH:/usr/sbin:/sbin # where zic and mount helpers are, and an ordinary user does not look
 
 die() {
