@@ -29,13 +29,10 @@ build() {
   cmake --build --preset "$1"
 }
 
-# Whether this is the second run that enter_private_namespace starts. Its word alone is not taken for that: the mount
-# namespace must really be another than that of the parent process, which stays outside.
+# Whether this is the second run that enter_private_namespace starts. It is the same process still, so a variable that
+# came from elsewhere is not taken for its word.
 in_private_namespace() {
-  local here outside
-  here=$(readlink /proc/self/ns/mnt)
-  outside=$(readlink "/proc/$PPID/ns/mnt") || outside=${TZRECONCILE_OUTSIDE-} # not to be seen from a user namespace
-  [[ ${TZRECONCILE_OUTSIDE-} == "$outside" && $outside != "$here" ]]
+  [[ ${TZRECONCILE_OUTSIDE-} == "$$ "* && $TZRECONCILE_OUTSIDE != "$$ $(readlink /proc/self/ns/mnt)" ]]
 }
 
 # Runs the calling script a second time, in a private mount namespace, and returns in that second run only. There /var
@@ -48,7 +45,7 @@ enter_private_namespace() {
     unshare --mount "${user[@]}" true || die 'no private mount namespace: run this as root, or allow user namespaces
 with sysctl user.max_user_namespaces=10000 and, where they exist, kernel.unprivileged_userns_clone=1 and
 kernel.apparmor_restrict_unprivileged_userns=0'
-    TZRECONCILE_OUTSIDE=$(readlink /proc/self/ns/mnt)
+    TZRECONCILE_OUTSIDE="$$ $(readlink /proc/self/ns/mnt)"
     export TZRECONCILE_OUTSIDE
     exec unshare --mount --propagation private "${user[@]}" "$script"
   fi

@@ -4,6 +4,7 @@
 
 #include <fstream>
 #include <ostream>
+#include <stdexcept>
 
 #include "sandbox.hpp"
 
@@ -20,6 +21,9 @@ struct boot {
 std::vector<boot> read_boots() {
   std::vector<boot> boots;
   std::ifstream file(BOOTS);
+  if (!file) {
+    throw std::runtime_error("cannot read " BOOTS);  // Without rows there would be no test, and so no failure.
+  }
   for (std::string line; std::getline(file, line);) {
     if (line.empty() || line.starts_with('#')) {
       continue;
