@@ -1,13 +1,12 @@
 # Sourced by the other scripts, from any directory; they go on at the top of the tree.
 # shellcheck shell=bash
 set -euo pipefail
-script=$(realpath "$0")
 cd "$(dirname "$(realpath "${BASH_SOURCE[0]}")")/.."
 umask 022 # what is staged and packaged is for all to read
 PATH=$PATH:/usr/sbin:/sbin # where zic and mount helpers are, and an ordinary user does not look
 
 die() {
-  printf '%s: %s\n' "${script##*/}" "$*" >&2
+  printf '%s: %s\n' "${0##*/}" "$*" >&2
   exit 1
 }
 
@@ -23,37 +22,15 @@ need() {
   "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get install -y -qq --no-install-recommends "${missing[@]}"
 }
 
+# build PRESET: prints nothing unless it fails.
 build() {
+  local output
   need g++ cmake ninja-build
-  cmake --preset "$1" >/dev/null
-  cmake --build --preset "$1"
+  output=$(cmake --preset "$1" 2>&1 && cmake --build --preset "$1" 2>&1) || die "$output"
 }
 
-# Whether this is the second run that enter_private_namespace starts. It is the same process still, so a variable that
-# came from elsewhere is not taken for its word.
-in_private_namespace() {
-  [[ ${TZRECONCILE_OUTSIDE-} == "$$ "* && $TZRECONCILE_OUTSIDE != "$$ $(readlink /proc/self/ns/mnt)" ]]
-}
-
-# Runs the calling script a second time, in a private mount namespace, and returns in that second run only. There /var
-# and /usr/share are fresh file systems, /var/tzdata.zi is the source of the machine's zone data, $root is empty, and
-# paths relative to the top of the tree still work, wherever that is.
-enter_private_namespace() {
-  local user=()
-  if ! in_private_namespace; then
-    ((EUID == 0)) || user=(--map-root-user)
-    unshare --mount "${user[@]}" true || die 'no private mount namespace: run this as root, or allow user namespaces
-with sysctl user.max_user_namespaces=10000 and, where they exist, kernel.unprivileged_userns_clone=1 and
-kernel.apparmor_restrict_unprivileged_userns=0'
-    TZRECONCILE_OUTSIDE="$$ $(readlink /proc/self/ns/mnt)"
-    export TZRECONCILE_OUTSIDE
-    exec unshare --mount --propagation private "${user[@]}" "$script"
-  fi
-  mount -t tmpfs tmpfs /var
-  cp /usr/share/zoneinfo/tzdata.zi /var/
-  mount -t tmpfs tmpfs /usr/share
-  root=''
-}
+# in_sandbox: whether /var and /usr/share are those of tests/sandbox.
+in_sandbox() { grep -q '^tzreconcile-sandbox /var ' /proc/self/mounts; }
 
 # zone_rule OFFSET NAME: the zone source on standard input, with Europe/Paris at that offset from UTC, the whole year,
 # from the end of the summer of 2026 on.
