@@ -1,4 +1,4 @@
-"""Stages a situation, starts the program once as a boot does, and compares what it left on disk.
+"""Stages a situation, runs the program once as a boot does, and compares what it leaves on disk.
 
 A situation is a list of statements, separated by ", ". Their paths are relative to /var/db/timezone:
   system VERSION [SCHEMA]    the system partition's data; "-" leaves the version or the schema out
@@ -25,6 +25,7 @@ from collections import namedtuple
 DEFAULT = "system 2021a, live system, localtime > /var/db/timezone/zoneinfo/Europe/Paris"
 STATE = "/var/db/timezone/"
 SYSTEM = "/usr/share/zoneinfo.default"
+ICU_FORMAT = "/usr/share/icu/icutzformat.txt"
 COVERED = ["/var", "/usr/share"]
 RELEASE = os.environ.get("TZRECONCILE", "build/release/tzreconcile").split()
 SANITIZED = ["build/dev/tzreconcile"]
@@ -39,29 +40,18 @@ with open("/proc/self/mounts") as file:
 os.umask(0o022)
 
 
-def zones(directory):
-    return [f"{directory}/{zone} = TZif" for zone in ("Europe/Paris", "America/Los_Angeles")]
-
-
-def word_file(path, word):
-    return f"- {path}" if word == "-" else f"{path} = {word}\\n"
-
-
 def in_full(statement):
-    """Returns the statements on paths that a shorter one stands for."""
+    """Returns the statements on paths that a statement stands for."""
     match statement.split():
         case ["system", version, *schema]:
-            icu = word_file("/usr/share/icu/icutzformat.txt", *schema or ["44l"])
-            return [
-                *zones(SYSTEM),
-                "/usr/share/icu /",
-                word_file(f"{SYSTEM}/+VERSION", version),
-                icu,
-            ]
+            words = {f"{SYSTEM}/+VERSION": version, ICU_FORMAT: (*schema, "44l")[0]}
+            files = [f"- {f}" if word == "-" else f"{f} = {word}\\n" for f, word in words.items()]
+            return [*zones(SYSTEM), "/usr/share/icu /", *files]
         case ["dataset", version, *schema]:
-            icu = [f"icutz{name}.dat =" for name in schema or ["44l"] if name != "-"]
-            return [*zones(f"tz/{version}/zoneinfo"), f"tz/{version}/icutz /"] + [
-                f"tz/{version}/icutz/{file}" for file in icu
+            file = "" if schema == ["-"] else f"icutz{(*schema, '44l')[0]}.dat ="
+            return [
+                *zones(f"tz/{version}/zoneinfo"),
+                f"tz/{version}/icutz/{file}" if file else f"tz/{version}/icutz /",
             ]
         case ["live", "system"]:
             return [f"zoneinfo > {SYSTEM}", "- icutz"]
@@ -76,16 +66,21 @@ def in_full(statement):
     return [statement]
 
 
+def zones(directory):
+    return [f"{directory}/{zone} = TZif" for zone in ("Europe/Paris", "America/Los_Angeles")]
+
+
 def entries(statements):
-    """Yields the path and the value of each statement, without the value for nothing at a path."""
+    """Yields path, kind and text of each statement; the kind of nothing at the path is empty."""
     for statement in (full for short in statements.split(", ") for full in in_full(short) if full):
         path, _, value = statement.partition(" ")
         if path == "-":
             path, value = value, ""
-        elif value[:1] not in ("=", ">", "/") and not value.startswith("mode "):
+        kind, _, text = value.partition(" ")
+        if kind not in ("", "/", "=", ">", "mode"):
             raise ValueError(f"no such statement: {statement}")
-        value = value.replace("> @", f"> {STATE}tz/")
-        yield os.path.normpath(os.path.join(STATE, path)), "= " if value == "=" else value
+        text = f"{STATE}tz/{text[1:]}" if text.startswith("@") else text
+        yield os.path.normpath(os.path.join(STATE, path)), kind, text
 
 
 def is_directory(path):
@@ -105,7 +100,8 @@ def create(path, kind, text):
         return
     if kind != "/" or not is_directory(path):
         remove(path)
-    os.makedirs(path if kind == "/" else os.path.dirname(path), exist_ok=True)
+    if kind:
+        os.makedirs(path if kind == "/" else os.path.dirname(path), exist_ok=True)
     if kind == ">":
         os.symlink(text, path)
     elif kind == "=":
@@ -118,44 +114,25 @@ def stage(situation):
         for name in os.listdir(covered):
             remove(os.path.join(covered, name))
     os.makedirs(STATE + "tz")
-    for path, value in entries(f"{DEFAULT}, {situation}"):
-        if value:
-            kind, _, text = value.partition(" ")
-            create(path, kind, text)
-        else:
-            remove(path)
+    for entry in entries(f"{DEFAULT}, {situation}"):
+        create(*entry)
 
 
 def read_disk():
     """Returns all that is below /var and /usr/share: path to "> TARGET", "= TEXT" or "/"."""
     disk = {}
-    for path in paths():
-        mode = os.lstat(path).st_mode
-        if stat.S_ISLNK(mode):
-            disk[path] = f"> {os.readlink(path)}"
-        elif stat.S_ISREG(mode):
-            with open(path, encoding="latin-1") as file:
-                disk[path] = f"= {file.read()}"
-        else:
-            disk[path] = "/"
-    return disk
-
-
-def paths():
     for covered in COVERED:
         for directory, directories, files in os.walk(covered):
-            yield from (os.path.join(directory, name) for name in directories + files)
-
-
-def read_stamps():
-    """Returns what any write changes, even one that leaves the contents as they were."""
-    stats = {path: os.lstat(path) for path in paths()}
-    return {path: (s.st_ino, s.st_mtime_ns, s.st_ctime_ns) for path, s in stats.items()}
-
-
-def changed(disk, statements):
-    """Returns what the disk becomes when the statements are carried out."""
-    return {path: value for path, value in (disk | dict(entries(statements))).items() if value}
+            for path in (os.path.join(directory, name) for name in directories + files):
+                mode = os.lstat(path).st_mode
+                if stat.S_ISLNK(mode):
+                    disk[path] = f"> {os.readlink(path)}"
+                elif stat.S_ISREG(mode):
+                    with open(path, encoding="latin-1") as file:
+                        disk[path] = f"= {file.read()}"
+                else:
+                    disk[path] = "/"
+    return disk
 
 
 def run(command=RELEASE, **options):
@@ -174,19 +151,26 @@ def is_warning(seen, expected):
     return error in ERRORS and expected in (seen, text)
 
 
-def check(outcome, before, changes, warnings=(), status=0):
-    """Fails with what was expected and what was seen, unless they are the same."""
-    expected, seen = changed(before, changes), read_disk()
-    problems = [
-        f"{path}\n  expected: {expected.get(path, 'nothing')}\n  seen:     {seen.get(path, 'nothing')}"
-        for path in sorted(expected.keys() | seen.keys())
-        if expected.get(path) != seen.get(path)
-    ]
-    if len(outcome.warnings) != len(warnings) or not all(
-        map(is_warning, outcome.warnings, warnings)
+def check_boot(situation, changes, warnings=None, status=0, command=RELEASE):
+    """Fails with what was expected and what was seen, unless a boot does as it should.
+
+    Nothing but the changes is to differ from the situation; without warnings, any will do.
+    """
+    stage(f"{situation}, {changes}")
+    expected = read_disk() | {"status": status, "warnings": warnings}
+    stage(situation)
+    os.utime(STATE, (0, 0))
+    outcome = run(command)
+    quiet = not changes and not outcome.warnings
+    assert not quiet or os.stat(STATE).st_mtime == 0, "a quiet boot has written"
+    seen = read_disk() | outcome._asdict()
+    pairs = zip(outcome.warnings, warnings or outcome.warnings, strict=False)
+    if (
+        warnings is None
+        or len(outcome.warnings) == len(warnings)
+        and all(is_warning(*p) for p in pairs)
     ):
-        problems += ["warnings", *(f"  expected: {w}" for w in warnings)]
-        problems += [f"  seen:     {w}" for w in outcome.warnings]
-    if outcome.status != status:
-        problems += [f"status\n  expected: {status}\n  seen:     {outcome.status}"]
-    assert not problems, "\n" + "\n".join(problems)
+        expected["warnings"] = outcome.warnings
+    differing = sorted(key for key in expected | seen if expected.get(key) != seen.get(key))
+    report = [f"{k}\n  expected: {expected.get(k)}\n  seen:     {seen.get(k)}" for k in differing]
+    assert not differing, "\n" + "\n".join(report)
