@@ -10,7 +10,7 @@ A situation is a list of statements, separated by ", ". Their paths are relative
   record TEXT                TZVersionDiffRecord holds the text
   PATH > TARGET              a link; "@" at the front of a target stands for /var/db/timezone/tz/
   PATH = TEXT                a file; a backslash escape, such as \\n, \\0 or \\xff, stands for a byte
-  PATH /                     a directory
+  PATH /                     an empty directory
   PATH mode MODE             the permissions of what is there, in octal digits
   - PATH                     nothing at the path
 A schema that is not given is 44l. Each situation begins as DEFAULT.
@@ -83,12 +83,8 @@ def entries(statements):
         yield os.path.normpath(os.path.join(STATE, path)), kind, text
 
 
-def is_directory(path):
-    return os.path.isdir(path) and not os.path.islink(path)
-
-
 def remove(path):
-    if is_directory(path):
+    if os.path.isdir(path) and not os.path.islink(path):
         shutil.rmtree(path)
     elif os.path.lexists(path):
         os.unlink(path)
@@ -98,8 +94,7 @@ def create(path, kind, text):
     if kind == "mode":
         os.chmod(path, int(text, 8))
         return
-    if kind != "/" or not is_directory(path):
-        remove(path)
+    remove(path)
     if kind:
         os.makedirs(path if kind == "/" else os.path.dirname(path), exist_ok=True)
     if kind == ">":
