@@ -1,20 +1,21 @@
 #pragma once
 
-/// The map of every fixed path: what stands there, who writes it, who reads it.
+/// The map of every fixed path: what is there, who writes it, who reads it.
 namespace paths {
 
 // The system partition, read-only.
 inline constexpr char system_zoneinfo[] = "/usr/share/zoneinfo.default";  // compiled zone files and "+VERSION"
 inline constexpr char system_icu[] = "/usr/share/icu";                    // ICU data and "icutzformat.txt"
 
-// The state directory. It and the dataset root are made when the device is set up, never by this program.
+// The state directory. It and the dataset root are created when the device is set up, never by this program.
 inline constexpr char state_directory[] = "/var/db/timezone/";
 inline constexpr char dataset_root[] = "/var/db/timezone/tz/";  // one directory per installed dataset, by its version
 
 // The live links, through which programs reach the data.
 inline constexpr char zoneinfo_link[] = "/var/db/timezone/zoneinfo";    // the zone files of the live dataset
-inline constexpr char icu_link[] = "/var/db/timezone/icutz";            // its ICU data, if it was installed
+inline constexpr char icu_link[] = "/var/db/timezone/icutz";            // its ICU data, if it is an installed one
 inline constexpr char localtime_link[] = "/var/db/timezone/localtime";  // one zone file, through zoneinfo_link
+inline constexpr char fallback_localtime[] = "/var/db/timezone/zoneinfo/America/Los_Angeles";  // its last resort
 
 // Notes to and from other software.
 inline constexpr char latest_link[] = "/var/db/timezone/tz_latest";        // newest dataset, from the update installer
@@ -22,8 +23,8 @@ inline constexpr char needs_cleanup[] = "/var/db/timezone/needs_cleanup";  // em
 inline constexpr char version_difference_record[] = "/var/db/timezone/TZVersionDiffRecord";  // the last switch
 
 // What earlier releases of the system left behind.
-inline constexpr char legacy_icu_link[] = "/var/db/icutz";              // where icu_link used to be
-inline constexpr char legacy_icu[] = "/var/db/icu";                     // no longer used, removed
-inline constexpr char older_zoneinfo_prefix[] = "/usr/share/zoneinfo";  // where localtime_link used to point
+inline constexpr char legacy_icu_link[] = "/var/db/icutz";               // where icu_link used to be
+inline constexpr char legacy_icu[] = "/var/db/icu";                      // no longer used, removed
+inline constexpr char legacy_zoneinfo_prefix[] = "/usr/share/zoneinfo";  // where localtime_link used to point
 
 }  // namespace paths

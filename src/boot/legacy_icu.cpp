@@ -7,12 +7,15 @@
 
 namespace boot {
 
-void migrate_legacy_icu_link() {
-  if (fs::path_exists(paths::legacy_icu_link) && !fs::path_exists(paths::icu_link)) {
+void migrate_legacy_icu_link() noexcept {
+  if (!fs::path_exists(paths::legacy_icu_link)) {
+    return;
+  }
+  if (!fs::path_exists(paths::icu_link)) {
     try {
-      fs::create_symlink(fs::read_symlink(paths::legacy_icu_link), paths::icu_link);
+      fs::create_symlink(fs::read_symlink(paths::legacy_icu_link).c_str(), paths::icu_link);
     } catch (...) {
-      // Programs do without the link, and the next switch makes it.
+      // Programs do without the link, and the next switch creates it.
       ::warn("Could not migrate %s to %s", paths::legacy_icu_link, paths::icu_link);
     }
   }
@@ -20,7 +23,7 @@ void migrate_legacy_icu_link() {
     try {
       fs::remove(paths::legacy_icu_link);
     } catch (...) {
-      // No program looks there any more; the next start tries again.
+      // No program looks there any more; the next boot tries again.
       ::warn("Could not remove %s", paths::legacy_icu_link);
     }
   }

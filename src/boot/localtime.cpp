@@ -12,30 +12,29 @@
 namespace boot {
 namespace {
 
-constexpr char fallback_zone[] = "America/Los_Angeles";
-
-void replace_localtime_link(const std::string& target) {
-  // Unlike fs::remove this takes an empty directory away too. If anything is left, the new link fails, which tells.
+void replace_localtime_link(const char* target) {
+  // Unlike fs::remove this removes an empty directory as well. If anything stays, create_symlink reports it.
   std::remove(paths::localtime_link);
   fs::create_symlink(target, paths::localtime_link);
 }
 
-/// Brings the link into its form as far as it can without giving up the zone. Returns whether it could.
-bool keep_zone() {
+/// Keeps the user's zone: accepts a link through the live zoneinfo link and rewrites one of the legacy form. Returns
+/// false when the zone cannot be kept.
+bool try_keep_zone() {
   const auto target = fs::read_symlink(paths::localtime_link);
   if (target.starts_with(paths::zoneinfo_link)) {
     return true;
   }
-  if (!target.starts_with(paths::older_zoneinfo_prefix)) {
+  if (!target.starts_with(paths::legacy_zoneinfo_prefix)) {
     return false;
   }
-  constexpr auto older_length = std::string_view(paths::older_zoneinfo_prefix).size();
-  const auto corrected = paths::zoneinfo_link + target.substr(older_length);
+  constexpr auto legacy_length = std::string_view(paths::legacy_zoneinfo_prefix).size();
+  const auto corrected = paths::zoneinfo_link + target.substr(legacy_length);
   ::warn("Correcting localtime link to %s", corrected.c_str());
-  if (!fs::path_exists(corrected)) {
+  if (!fs::path_exists(corrected.c_str())) {
     return false;
   }
-  replace_localtime_link(corrected);
+  replace_localtime_link(corrected.c_str());
   return true;
 }
 
@@ -43,14 +42,14 @@ bool keep_zone() {
 
 void repair_localtime_link() {
   try {
-    if (keep_zone()) {
+    if (try_keep_zone()) {
       return;
     }
   } catch (...) {
     // Whatever failed, a device with some local time is better than one with none.
   }
-  ::warn("localtime link invalid; resetting to %s", fallback_zone);
-  replace_localtime_link(std::string(paths::zoneinfo_link) + "/" + fallback_zone);
+  ::warn("localtime link invalid; resetting to America/Los_Angeles");
+  replace_localtime_link(paths::fallback_localtime);
 }
 
 }  // namespace boot

@@ -3,14 +3,13 @@
 #include <err.h>
 
 #include <cstdio>
-#include <cstdlib>
-#include <fstream>
 #include <string>
 
 #include "boot/legacy_icu.hpp"
 #include "boot/localtime.hpp"
 #include "boot/state.hpp"
 #include "dataset/dataset.hpp"
+#include "fs/file_system.hpp"
 #include "paths.hpp"
 
 namespace boot {
@@ -18,44 +17,48 @@ namespace {
 
 using dataset::vrel_dataset;
 
-/// Returns the path of the dataset that the links point into. Links that point nowhere sensible are reset to the
-/// system partition first, whose path is empty.
-std::string valid_current_path() {
+/// Returns the path of the current dataset. If the zoneinfo link is missing or not recognised, the system partition's
+/// data is made live first, whose path is empty.
+std::string current_path_or_reset() {
   try {
     return current_dataset_path();
   } catch (...) {
+    // So does the first boot of a device, on which the link does not exist yet.
     ::warn("Invalid current symlinks; resetting to system partition");
   }
   vrel_dataset::reset_to_system();
   return {};
 }
 
-bool fits_system(const vrel_dataset& current, const vrel_dataset& system) {
-  return all_compatible(current, system) && !newer_than(system, current);
-}
-
-/// Returns the dataset that the links point at from here on: the current one, or the system partition's in its place.
-const vrel_dataset& keep_or_reset(const vrel_dataset& current, const vrel_dataset& system) {
-  if (fits_system(current, system)) {
-    return current;
+/// Makes the system partition's data live unless the current dataset has its schema and is not older. Returns whether
+/// the current dataset stays live.
+bool keep_or_reset(const vrel_dataset& current, const vrel_dataset& system) {
+  if (all_compatible(current, system) && !newer_than(system, current)) {
+    return true;
   }
   ::warn("Symlink points at data incompatible with installed system");
   vrel_dataset::reset_to_system();
   mark_needs_cleanup();
-  return system;
+  return false;
 }
 
-// The record is for information: a switch stands without it, so a failure to write it is not reported.
-void record_switch(const vrel_dataset& from, const vrel_dataset& to) {
-  std::ofstream record(paths::version_difference_record);
-  record << version_string(from) << '_' << version_string(to);
+void switch_datasets(const vrel_dataset& from, const vrel_dataset& to, const vrel_dataset& system) {
+  activate_all(to);
+  if (!same_path(from, system)) {
+    mark_needs_cleanup();
+  }
+  // For information: the switch holds without the record, so a failure to write it is not reported.
+  fs::write_file(paths::version_difference_record, version_string(from) + '_' + version_string(to));
 }
 
-void decide() {
+/// Makes the dataset live that is to be live at this boot.
+///
+/// Throws when any of the datasets cannot be read or the one that is chosen cannot be made live.
+void reconcile_datasets() {
   const vrel_dataset system;
   const auto latest_path = latest_dataset_path();
-  const vrel_dataset current(valid_current_path());
-  const auto& in_force = keep_or_reset(current, system);
+  const vrel_dataset current(current_path_or_reset());
+  const bool kept = keep_or_reset(current, system);
   if (latest_path.empty()) {
     return;
   }
@@ -65,49 +68,33 @@ void decide() {
            version_string(current).c_str());
     return;
   }
-  activate_all(latest);
-  if (!same_path(in_force, system)) {
-    mark_needs_cleanup();
-  }
-  record_switch(in_force, latest);
+  switch_datasets(kept ? current : system, latest, system);
 }
 
-/// Makes the right dataset live, or the system partition's when anything goes wrong. Returns whether that went through.
-bool make_data_live() {
+/// Returns whether the step comes to its end. One that fails must not keep the others from being tried.
+bool succeeds(void (*step)()) noexcept {
   try {
-    decide();
+    step();
     return true;
   } catch (...) {
-    ::warn("Unable to locate data; resetting to system partition");
-  }
-  try {
-    vrel_dataset::reset_to_system();
-    return true;
-  } catch (...) {
-    return false;  // The local time can be repaired all the same.
-  }
-}
-
-/// Repairs the local time link. Returns whether that went through.
-bool make_localtime_right() {
-  try {
-    repair_localtime_link();
-    return true;
-  } catch (...) {
-    return false;  // The failed call has warned.
+    return false;
   }
 }
 
 }  // namespace
 
-int reconcile() {
+bool reconcile() noexcept {
   prepare_state_directories();
   migrate_legacy_icu_link();
   std::remove(paths::needs_cleanup);
   std::remove(paths::legacy_icu);
-  const bool data_is_live = make_data_live();
-  const bool localtime_is_right = make_localtime_right();
-  return data_is_live && localtime_is_right ? EXIT_SUCCESS : EXIT_FAILURE;
+  bool live = succeeds(reconcile_datasets);
+  if (!live) {
+    ::warn("Unable to locate data; resetting to system partition");
+    live = succeeds(vrel_dataset::reset_to_system);
+  }
+  const bool local = succeeds(repair_localtime_link);
+  return live && local;
 }
 
 }  // namespace boot

@@ -1,12 +1,15 @@
 #pragma once
 
+/// What happens at a boot: one dataset is made live, the links of earlier releases and the local time link are
+/// repaired.
 namespace boot {
 
-/// Makes the live links right, once, at the start of the system: decides between the dataset that is live, the latest
-/// installed one and the system partition's, makes one of them live, and repairs what surrounds the links.
+/// Reconciles the live links with the data that there is: decides between the dataset that is live, the latest
+/// installed one and the system partition's, makes one of them live, and repairs the links around them.
 ///
-/// Returns the exit status: 0 when the run came to its end, also when that took the fallback to the system partition's
-/// data; 1 when the fallback itself or the repair of the local time link failed. The other of the two has then run.
-int reconcile();
+/// Returns whether the links are consistent in the end, even if that took the system partition's data. False when
+/// neither a dataset nor the fallback could be made live, or the local time link could not be repaired; each is
+/// attempted whatever became of the other.
+bool reconcile() noexcept;
 
 }  // namespace boot

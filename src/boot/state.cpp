@@ -17,23 +17,13 @@ namespace {
 constexpr int protection_class = 4;
 constexpr int rejected_link = -1;
 
-void set_protection_class(const char* path) noexcept {
-  const int descriptor = ::open(path, O_RDONLY | O_CLOEXEC);
-  if (descriptor < 0) {
-    // Whatever is wrong here shows when the links are read, and the data is of use in any class.
-    return;
-  }
-  platform::set_protection_class(descriptor, protection_class);
-  ::close(descriptor);
-}
-
-/// Makes the file unless it exists. Returns whether every call succeeded; errno is that of the last that did not.
+/// Creates the file unless it exists. Returns whether every call succeeded; errno is that of the last that did not.
 bool touch(const char* path) noexcept {
   const int descriptor = platform::open_protected(path, O_RDWR | O_CREAT, protection_class, 0666);
   if (descriptor < 0) {
     return false;
   }
-  struct stat status;  // Not looked at: that it can be had shows that the file is there.
+  struct stat status;  // Not looked at: a failing fstat counts as a failed touch.
   const bool is_there = ::fstat(descriptor, &status) == 0;
   const bool closed = ::close(descriptor) == 0;
   return is_there && closed;
@@ -42,8 +32,9 @@ bool touch(const char* path) noexcept {
 }  // namespace
 
 void prepare_state_directories() noexcept {
-  set_protection_class(paths::state_directory);
-  set_protection_class(paths::dataset_root);
+  // A directory that is missing is reported when the links are read, and the data can be used in any class.
+  platform::set_protection_class(paths::state_directory, protection_class);
+  platform::set_protection_class(paths::dataset_root, protection_class);
 }
 
 std::string latest_dataset_path() { return fs::read_symlink(paths::latest_link); }
@@ -54,7 +45,7 @@ std::string dataset_path_from_link(const std::string& target) {
   constexpr std::string_view root = paths::dataset_root;
   if (target.starts_with(root)) {
     const auto last_slash = target.rfind('/');
-    // At least one byte must stand between the root and that slash: the name of the dataset.
+    // At least one byte must be between the root and that slash: the name of the dataset.
     if (last_slash > root.size()) {
       return target.substr(0, last_slash);
     }

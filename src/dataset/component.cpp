@@ -7,14 +7,12 @@
 
 namespace dataset {
 
-vrel_zoneinfo::vrel_zoneinfo() : data_directory_(paths::system_zoneinfo) { initialize(); }
-
 vrel_zoneinfo::vrel_zoneinfo(const std::string& path)
     : vrel_dataset_component(path), data_directory_(path.empty() ? paths::system_zoneinfo : path + "/zoneinfo") {
   initialize();
 }
 
-void vrel_zoneinfo::initialize() { zoneinfo_version_ = fs::first_word(data_directory_ + "/+VERSION"); }
+void vrel_zoneinfo::initialize() { zoneinfo_version_ = fs::first_word((data_directory_ + "/+VERSION").c_str()); }
 
 bool vrel_zoneinfo::compatible_schema(const vrel_dataset_component* /*other*/) const { return true; }
 
@@ -22,10 +20,10 @@ void vrel_zoneinfo::activate() const {
   try {
     fs::remove(paths::zoneinfo_link);
   } catch (...) {
-    // Whatever still stands there makes the new link fail, and that decides.
+    // If anything is left there, creating the new link fails, and that decides.
     ::warn("Unlink of zoneinfo softlink failed");
   }
-  fs::create_symlink(data_directory_, paths::zoneinfo_link);
+  fs::create_symlink(data_directory_.c_str(), paths::zoneinfo_link);
 }
 
 std::string vrel_zoneinfo::zoneinfo_version() const { return zoneinfo_version_; }

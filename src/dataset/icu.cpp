@@ -25,32 +25,30 @@ bool is_file_readable_by_all(const FTSENT& entry) {
 
 }  // namespace
 
-vrel_icu::vrel_icu() : data_directory(paths::system_icu) { initialize(); }
-
 vrel_icu::vrel_icu(const std::string& path)
-    : vrel_dataset_component(path), data_directory(path.empty() ? paths::system_icu : path + "/icutz") {
+    : vrel_dataset_component(path), data_directory_(path.empty() ? paths::system_icu : path + "/icutz") {
   initialize();
 }
 
 void vrel_icu::initialize() {
-  if (dataset_path.empty()) {
-    schema = fs::first_word(data_directory + "/icutzformat.txt");
+  if (dataset_path_.empty()) {
+    schema_ = fs::first_word((data_directory_ + "/icutzformat.txt").c_str());
     return;
   }
   read_schema_from_file_names();
-  if (schema.empty()) {
-    ::warn("No ICU schema found for %s", dataset_path.c_str());
+  if (schema_.empty()) {
+    ::warn("No ICU schema found for %s", dataset_path_.c_str());
   }
 }
 
 void vrel_icu::read_schema_from_file_names() {
-  char* const roots[] = {data_directory.data(), nullptr};
+  char* const roots[] = {data_directory_.data(), nullptr};
   const walk_handle walk(::fts_open(roots, FTS_COMFOLLOW | FTS_PHYSICAL | FTS_XDEV, nullptr));
   if (!walk) {
-    fs::warn_and_raise("tz_icu::initialize: fts_open of %s failed, %s", data_directory.c_str(), std::strerror(errno));
+    fs::warn_and_raise("tz_icu::initialize: fts_open of %s failed, %s", data_directory_.c_str(), std::strerror(errno));
   }
   while (FTSENT* const entry = ::fts_read(walk.get())) {
-    if (!schema.empty()) {
+    if (!schema_.empty()) {
       return;
     }
     if (entry->fts_level != 1) {
@@ -60,7 +58,7 @@ void vrel_icu::read_schema_from_file_names() {
       // Nothing further down can match, and a large tree there must not delay a boot.
       ::fts_set(walk.get(), entry, FTS_SKIP);
     } else if (is_file_readable_by_all(*entry)) {
-      schema = schema_in_file_name({entry->fts_name, entry->fts_namelen});
+      schema_ = schema_in_file_name({entry->fts_name, entry->fts_namelen});
     }
   }
 }
@@ -71,7 +69,7 @@ bool vrel_icu::compatible_schema(const vrel_dataset_component* other) const {
     ::warn("vrel_icu::compatible_schema: could not dynamic_cast other component");
     return false;
   }
-  return schema == other_icu->schema;
+  return schema_ == other_icu->schema_;
 }
 
 void vrel_icu::activate() const {
@@ -79,12 +77,12 @@ void vrel_icu::activate() const {
     fs::remove(paths::icu_link);
     fs::remove(paths::legacy_icu_link);
   } catch (...) {
-    // The system's data needs no link. For installed data the new link fails if the old one is still there, and what
-    // is left at the place of earlier releases is in nobody's way.
+    // For installed data, creating the new link fails if the old one is still there. The system's data needs no link,
+    // and a legacy link that stays is in nobody's way.
     ::warn("unlink of ICU softlink failed");
   }
-  if (!dataset_path.empty()) {
-    fs::create_symlink(data_directory, paths::icu_link);
+  if (!dataset_path_.empty()) {
+    fs::create_symlink(data_directory_.c_str(), paths::icu_link);
   }
 }
 

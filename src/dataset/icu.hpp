@@ -10,27 +10,24 @@ namespace dataset {
 /// The ICU time-zone data of a dataset. It has a schema, such as 44l, and fits only data of the same schema.
 class vrel_icu final : public vrel_dataset_component {
  public:
-  /// The ICU data of the system partition.
-  vrel_icu();
-
   /// The ICU data of the dataset at `path`; that of the system partition when `path` is empty. Installed data in
   /// which no file, readable by all, names a schema gives a warning, and its schema is empty.
   ///
   /// Throws errno, after a warning, when the data's directory cannot be walked at all (ENOMEM).
-  explicit vrel_icu(const std::string& path);
+  explicit vrel_icu(const std::string& path = {});
 
   /// Returns whether `other` is ICU data of the same schema, an empty one included. Warns when it is no ICU data.
   bool compatible_schema(const vrel_dataset_component* other) const override;
 
-  /// Also removes the link at its place in earlier releases. For the system's data no link is made.
+  /// Also removes the legacy link. For the system's data no link is created.
   void activate() const override;
 
  private:
   void initialize();
   void read_schema_from_file_names();
 
-  std::string schema;
-  std::string data_directory;
+  std::string schema_;
+  std::string data_directory_;
 };
 
 /// Returns the schema in the name of an ICU data file: "icutz", the schema, ".dat", where the schema is decimal digits

@@ -1,8 +1,9 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 
-/// The file-system operations of the links and their data. A failure that an operation does not tolerate is reported
+/// The file-system operations of the links and their data. Each failure that an operation does not tolerate is reported
 /// and raised by `warn_and_raise`; the failed call has changed nothing on disk.
 namespace fs {
 
@@ -14,26 +15,31 @@ namespace fs {
 
 /// Deletes a file or a symbolic link itself, never a directory. A path that does not exist counts as deleted.
 ///
-/// Throws errno as `unlink` sets it: EISDIR for a directory.
-void remove(const std::string& path);
+/// Throws errno as `unlink` sets it. For a directory that is EISDIR on Linux, EPERM on other systems.
+void remove(const char* path);
 
 /// Returns whether the path exists once every link is followed: false for a dangling link.
-bool path_exists(const std::string& path) noexcept;
+bool path_exists(const char* path) noexcept;
 
-/// Returns the bytes that the link stores, cut to the first 1024; empty when nothing stands at `path`.
-/// The target itself need not exist.
+/// Returns the bytes that the link holds, cut to the first 1024; empty when nothing exists at `path`. The target itself
+/// need not exist.
 ///
 /// Throws errno as `readlink` sets it: EINVAL for anything but a link.
-std::string read_symlink(const std::string& path);
+std::string read_symlink(const char* path);
 
-/// Makes a link at `link` that holds the text `target`, which is not examined.
+/// Creates a link at `link` that holds the text `target`, which is not examined.
 ///
-/// Throws errno as `symlink` sets it: EEXIST when anything, even a dangling link, stands at `link`; that stays as it
-/// was.
-void create_symlink(const std::string& target, const std::string& link);
+/// Throws errno as `symlink` sets it: EEXIST when anything, even a dangling link, is at `link`; that stays as it was.
+void create_symlink(const char* target, const char* link);
 
-/// Returns the first word of a text file: leading white space is skipped, the word ends at the next white space or
-/// at the end of the file. Empty, without a warning, when the file cannot be read or is blank.
-std::string first_word(const std::string& path);
+/// Returns the first word of a file: the bytes from the first that is not white space up to the next white space, at
+/// most 16 MiB. Empty, without a warning, when there is none, the file cannot be read or is not a regular one. Never
+/// waits for a FIFO or a device.
+std::string first_word(const char* path);
+
+/// Replaces the content of a file, which is created with mode 0666 less the umask if it does not exist. What exists and
+/// is not a regular file is left alone, and never waited for. A failure gives no warning; the file may then be empty,
+/// or hold the beginning of the text.
+void write_file(const char* path, std::string_view text) noexcept;
 
 }  // namespace fs

@@ -1,13 +1,19 @@
 #include "platform/data_protection.hpp"
 
 #include <fcntl.h>
+#include <unistd.h>
 
 namespace platform {
 
 #ifdef F_SETPROTECTIONCLASS
 
-void set_protection_class(int descriptor, int protection_class) noexcept {
+void set_protection_class(const char* path, int protection_class) noexcept {
+  const int descriptor = ::open(path, O_RDONLY | O_CLOEXEC);
+  if (descriptor < 0) {
+    return;
+  }
   ::fcntl(descriptor, F_SETPROTECTIONCLASS, protection_class);
+  ::close(descriptor);
 }
 
 int open_protected(const char* path, int flags, int protection_class, mode_t mode) noexcept {
@@ -17,7 +23,7 @@ int open_protected(const char* path, int flags, int protection_class, mode_t mod
 
 #else
 
-void set_protection_class(int /*descriptor*/, int /*protection_class*/) noexcept {}
+void set_protection_class(const char* /*path*/, int /*protection_class*/) noexcept {}
 
 int open_protected(const char* path, int flags, int /*protection_class*/, mode_t mode) noexcept {
   return ::open(path, flags, mode);
