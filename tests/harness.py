@@ -11,6 +11,7 @@ A situation is a list of statements, separated by ", ". Their paths are relative
   PATH > TARGET              a link; "@" at the front of a target stands for /var/db/timezone/tz/
   PATH = TEXT                a file; a backslash escape, such as \\n, \\0 or \\xff, stands for a byte
   PATH /                     an empty directory
+  PATH fifo                  a FIFO
   PATH mode MODE             the permissions of what is there, in octal digits
   - PATH                     nothing at the path
 A schema that is not given is 44l. Each situation begins as DEFAULT.
@@ -77,7 +78,7 @@ def entries(statements):
         if path == "-":
             path, value = value, ""
         kind, _, text = value.partition(" ")
-        if kind not in ("", "/", "=", ">", "mode"):
+        if kind not in ("", "/", "=", ">", "fifo", "mode"):
             raise ValueError(f"no such statement: {statement}")
         text = f"{STATE}tz/{text[1:]}" if text.startswith("@") else text
         yield os.path.normpath(os.path.join(STATE, path)), kind, text
@@ -99,6 +100,8 @@ def create(path, kind, text):
         os.makedirs(path if kind == "/" else os.path.dirname(path), exist_ok=True)
     if kind == ">":
         os.symlink(text, path)
+    elif kind == "fifo":
+        os.mkfifo(path)
     elif kind == "=":
         with open(path, "wb") as file:
             file.write(text.encode().decode("unicode_escape").encode("latin-1"))
@@ -114,7 +117,7 @@ def stage(situation):
 
 
 def read_disk():
-    """Returns all that is below /var and /usr/share: path to "> TARGET", "= TEXT" or "/"."""
+    """Returns all that is below /var and /usr/share: path to "> TARGET", "= TEXT", "/" or "fifo"."""
     disk = {}
     for covered in COVERED:
         for directory, directories, files in os.walk(covered):
@@ -126,13 +129,13 @@ def read_disk():
                     with open(path, encoding="latin-1") as file:
                         disk[path] = f"= {file.read()}"
                 else:
-                    disk[path] = "/"
+                    disk[path] = "/" if stat.S_ISDIR(mode) else "fifo"
     return disk
 
 
 def run(command=RELEASE, **options):
     """Runs the program, or a command that ends in it. The options are subprocess.run's."""
-    defaults = {"stdin": subprocess.DEVNULL, "stderr": subprocess.PIPE, "timeout": 60}
+    defaults = {"stdin": subprocess.DEVNULL, "stderr": subprocess.PIPE, "timeout": 10}
     result = subprocess.run(command, **defaults | options)
     # A line that does not begin with the program's name belongs to the warning before it.
     text = "\n" + (result.stderr or b"").decode("latin-1")

@@ -7,12 +7,13 @@ import subprocess
 import pytest
 
 import harness
-from harness import STATE
+from harness import ICU_FORMAT, STATE, SYSTEM
 from test_faults import traced_run
 
 RESET = f"localtime > {STATE}zoneinfo/America/Los_Angeles"
 SWITCH = "dataset 2021b.1.0, live 2021b.1.0, dataset 2022a.1.0, latest 2022a.1.0, localtime ="
 SWITCHED = f"live 2022a.1.0, marker, record 2021b.1.0_2022a.1.0, {RESET}"
+SPARSE = "sparse() { : >$1; truncate -s 100G $1; }; sparse"
 FULL = "nr_inodes=$(($(stat -f -c %c-%d /var)))"
 
 # Scripts that run the program, with what becomes of SWITCH and the exit status.
@@ -28,6 +29,11 @@ ENVIRONMENTS = {
     f"umask 027; $0; [[ $(stat -c %a {STATE}[Tn]* | uniq) == 640 ]]": (SWITCHED, 0),
     # Without its files the system has no schema and no version, and no directory is walked: all fits.
     "ulimit -n 3; exec $0": (f"live 2022a.1.0, {RESET}", 0),
+    f"{SPARSE} {SYSTEM}/+VERSION; $0; s=$?; echo 2021a >{SYSTEM}/+VERSION; exit $s": (SWITCHED, 0),
+    f"{SPARSE} {ICU_FORMAT}; $0; s=$?; echo 44l >{ICU_FORMAT}; exit $s": (
+        f"live system, marker, {RESET}",
+        0,
+    ),
     f"rm -r {STATE}; exec $0": ("- .", 1),
     "mount -o remount,ro /var; $0; s=$?; mount -o remount,rw /var; exit $s": ("", 1),
     f"rm {STATE}localtime; mount -o remount,{FULL} /var; $0; s=$?; "
@@ -46,6 +52,12 @@ def test_a_version_of_megabytes_does_not_stop_the_local_time_repair(version, sta
     for byte in "7a":
         version = version.replace(byte, byte * (8 << 20))
     harness.check_boot(f"system {version}, - localtime", RESET, None, status)
+
+
+def test_without_memory_the_local_time_is_repaired():
+    version = "7" * (8 << 20)
+    command = ["bash", "-c", "ulimit -v 8000; exec $0", *harness.RELEASE]
+    harness.check_boot(f"system {version}, - localtime", RESET, None, 1, command)
 
 
 def test_a_link_target_is_cut_to_1024_bytes():
