@@ -22,11 +22,25 @@ need() {
   "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get install -y -qq --no-install-recommends "${missing[@]}"
 }
 
-# build PRESET: prints nothing unless it fails.
-build() {
+# quietly COMMAND...: prints what the command prints only if it fails.
+quietly() {
   local output
-  need g++ cmake ninja-build
-  output=$(cmake --preset "$1" 2>&1 && cmake --build --preset "$1" 2>&1) || die "$output"
+  output=$("$@" 2>&1) || die "$* failed:"$'\n'"$output"
+}
+
+# build PRESET [DIRECTORY]: builds in build/DIRECTORY, or in the preset's own, with the compiler in $CXX.
+build() {
+  need cmake ninja-build
+  [[ -v CXX ]] || need g++
+  quietly cmake --preset "$1" -B "build/${2:-$1}"
+  quietly cmake --build "build/${2:-$1}"
+}
+
+# run_pytest ARGUMENT...: runs pytest with a worker for each processor core, each in a sandbox of its own.
+run_pytest() {
+  need python3-pytest python3-pytest-xdist util-linux
+  tests/sandbox /usr/bin/python3 -B -m pytest --quiet --tb short -p no:cacheprovider --override-ini testpaths=tests \
+    --dist load --tx "$(nproc)*popen//python=tests/sandbox /usr/bin/python3 -B" "$@"
 }
 
 # in_sandbox: whether /var and /usr/share are those of tests/sandbox.
