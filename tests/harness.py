@@ -30,7 +30,7 @@ ICU_FORMAT = "/usr/share/icu/icutzformat.txt"
 COVERED = ["/var", "/usr/share"]
 RELEASE = os.environ.get("TZRECONCILE", "build/release/tzreconcile").split()
 SANITIZED = ["build/dev/tzreconcile"]
-IN_2041 = 2240611200  # Later than 32 bits can tell.
+IN_2041 = 2240611200  # Seconds that do not fit into 32 bits.
 ERRORS = {os.strerror(number) for number in range(134)}
 
 Outcome = namedtuple("Outcome", "status warnings")

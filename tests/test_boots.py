@@ -28,9 +28,9 @@ BOOTS = {name: boot for name, *boot in read_boots()}
 @pytest.mark.parametrize("name", BOOTS)
 def test_boot(name, binary):
     situation, lines = BOOTS[name]
-    told = {"->": [], "!": [], "exit": ["0"]}
+    rows = {"->": [], "!": [], "exit": ["0"]}
     for line in lines:
         kind, _, rest = line.partition(" ")
-        told[kind].append(rest)
-    changes, status = ", ".join(told["->"]), int(told["exit"][-1])
-    harness.check_boot(situation, changes, told["!"], status, BINARIES[binary])
+        rows[kind].append(rest)
+    changes, status = ", ".join(rows["->"]), int(rows["exit"][-1])
+    harness.check_boot(situation, changes, rows["!"], status, BINARIES[binary])

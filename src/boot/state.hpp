@@ -15,7 +15,7 @@ std::string latest_dataset_path();
 
 /// Returns the path of the dataset that the live zoneinfo link points into, empty for the system partition.
 ///
-/// Throws what `fs::read_symlink` and `dataset_path_from_link` throw, the latter also for a missing link.
+/// Throws what `fs::read_symlink` throws, and what `dataset_path_from_link` throws: it rejects a missing link.
 std::string current_dataset_path();
 
 /// Returns the path of the dataset that the zoneinfo link's `target` lies in: all before the last "/" when the target
