@@ -1,6 +1,6 @@
 #pragma once
 
-/// The map of every fixed path: what is there, who writes it, who reads it.
+/// The map of every fixed path. The directories and files in a dataset are named by its components.
 namespace paths {
 
 // The system partition, read-only.

@@ -64,7 +64,7 @@ def in_full(statement):
         case ["marker"]:
             return ["needs_cleanup ="]
         case ["record", *_]:
-            return [statement.replace("record", "TZVersionDiffRecord =", 1)]
+            return [f"TZVersionDiffRecord ={statement[6:]}"]
     return [statement]
 
 

@@ -24,6 +24,7 @@ ENVIRONMENTS = {
     "exec $0 <&- >&- 2>&-": (SWITCHED, 0),
     "exec $0 2>/dev/full": (SWITCHED, 0),
     "exec 2> >(exec true) && wait $! && exec $0": (SWITCHED, 0),
+    "ulimit -f 0; exec $0": (SWITCHED.replace(" 2021b.1.0_2022a.1.0", ""), 0),
     "exec $0 --help -x ''": (SWITCHED, 0),
     "p=$(realpath $0); mkdir /var/gone; cd /var/gone; rmdir /var/gone; exec $p": (SWITCHED, 0),
     f"umask 027; $0; [[ $(stat -c %a {STATE}[Tn]* | uniq) == 640 ]]": (SWITCHED, 0),

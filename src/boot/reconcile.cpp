@@ -17,17 +17,17 @@ namespace {
 
 using dataset::vrel_dataset;
 
-/// Returns the path of the current dataset. If the zoneinfo link is missing or not recognised, the system partition's
-/// data is made live first, whose path is empty.
+/// Returns the path of the current dataset. If the zoneinfo link is missing, cannot be read or is not recognised, the
+/// system partition's data is made live first, whose path is empty.
 std::string current_path_or_reset() {
   try {
     return current_dataset_path();
   } catch (...) {
-    // So does the first boot of a device, on which the link does not exist yet.
+    // Normal at the first boot of a device: the link does not exist yet.
     ::warn("Invalid current symlinks; resetting to system partition");
+    vrel_dataset::reset_to_system();
+    return {};
   }
-  vrel_dataset::reset_to_system();
-  return {};
 }
 
 /// Makes the system partition's data live unless the current dataset has its schema and is not older. Returns whether
@@ -42,18 +42,19 @@ bool keep_or_reset(const vrel_dataset& current, const vrel_dataset& system) {
   return false;
 }
 
+/// Makes `to` live in place of `from`, with a marker if that was an installed dataset, and writes the record.
 void switch_datasets(const vrel_dataset& from, const vrel_dataset& to, const vrel_dataset& system) {
   activate_all(to);
   if (!same_path(from, system)) {
     mark_needs_cleanup();
   }
-  // For information: the switch holds without the record, so a failure to write it is not reported.
+  // For information: the switch holds without the record, so a failed write is not reported.
   fs::write_file(paths::version_difference_record, version_string(from) + '_' + version_string(to));
 }
 
 /// Makes the dataset live that is to be live at this boot.
 ///
-/// Throws when any of the datasets cannot be read or the one that is chosen cannot be made live.
+/// Throws when "tz_latest" or a version is unusable, or a live link cannot be created.
 void reconcile_datasets() {
   const vrel_dataset system;
   const auto latest_path = latest_dataset_path();
@@ -63,6 +64,7 @@ void reconcile_datasets() {
     return;
   }
   const vrel_dataset latest(latest_path);
+  // Compared with the current dataset even if that was just rejected: the next boot judges the new one by the system's.
   if (!all_compatible(latest, system) || !newer_than(latest, current)) {
     ::warn("New update not compatible or older version: %s vs. %s", version_string(latest).c_str(),
            version_string(current).c_str());
@@ -86,6 +88,7 @@ bool succeeds(void (*step)()) noexcept {
 bool reconcile() noexcept {
   prepare_state_directories();
   migrate_legacy_icu_link();
+  // What an earlier run and earlier releases left. If it stays, nothing depends on it.
   std::remove(paths::needs_cleanup);
   std::remove(paths::legacy_icu);
   bool live = succeeds(reconcile_datasets);

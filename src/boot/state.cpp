@@ -32,7 +32,7 @@ bool touch(const char* path) noexcept {
 }  // namespace
 
 void prepare_state_directories() noexcept {
-  // A directory that is missing is reported when the links are read, and the data can be used in any class.
+  // The class is optional: the data can be used in any.
   platform::set_protection_class(paths::state_directory, protection_class);
   platform::set_protection_class(paths::dataset_root, protection_class);
 }
