@@ -18,7 +18,7 @@ class vrel_dataset_component {
   virtual bool compatible_schema(const vrel_dataset_component* other) const = 0;
 
   /// Repoints the live link of this kind of data at this component's directory: removes the link and creates it anew.
-  /// A link that cannot be removed gives a warning only.
+  /// A link that cannot be removed gives warnings only.
   ///
   /// Throws errno when the link cannot be created; what was removed stays removed.
   virtual void activate() const = 0;

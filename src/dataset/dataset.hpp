@@ -36,7 +36,7 @@ class vrel_dataset {
   /// Returns whether each component of `a` is compatible with its counterpart in `b`.
   friend bool all_compatible(const vrel_dataset& a, const vrel_dataset& b);
 
-  /// Repoints the live links at `d`, one component after the other.
+  /// Makes `d` live, one component after the other.
   ///
   /// Throws errno when a link cannot be created: the links before it stay repointed, those after it are not touched.
   friend void activate_all(const vrel_dataset& d);

@@ -19,7 +19,7 @@ struct walk_closer {
 };
 using walk_handle = std::unique_ptr<FTS, walk_closer>;
 
-bool is_file_readable_by_all(const FTSENT& entry) {
+bool is_file_readable_by_others(const FTSENT& entry) {
   return entry.fts_errno == 0 && entry.fts_info == FTS_F && (entry.fts_statp->st_mode & S_IROTH) != 0;
 }
 
@@ -57,7 +57,7 @@ void vrel_icu::read_schema_from_file_names() {
     if (entry->fts_info == FTS_D) {
       // Nothing further down can match, and a large tree there must not delay a boot.
       ::fts_set(walk.get(), entry, FTS_SKIP);
-    } else if (is_file_readable_by_all(*entry)) {
+    } else if (is_file_readable_by_others(*entry)) {
       schema_ = schema_in_file_name({entry->fts_name, entry->fts_namelen});
     }
   }
