@@ -29,6 +29,22 @@ build() {
   cmake --build --preset "$1"
 }
 
+# package DIRECTORY [OPTION...]: builds the Debian packages of the tracked files, with these options of
+# dpkg-buildpackage, into DIRECTORY. They are built elsewhere: debhelper fails below a directory with a
+# blank in its name.
+package() {
+  local tree
+  need cmake debhelper dpkg-dev g++ git
+  tree=$(mktemp -d)
+  rm -rf "$1"
+  mkdir -p "$1" "$tree/source"
+  git ls-files -z | xargs -0 cp --parents -t "$tree/source"
+  (cd "$tree/source" && dpkg-buildpackage --build=binary --no-sign "${@:2}") >"$1/log" 2>&1 ||
+    die "the package was not built, see $1/log"
+  mv "$tree"/*.deb "$1"
+  rm -rf "$tree"
+}
+
 # Whether this is the second run that enter_private_namespace starts. It is the same process still, so a variable that
 # came from elsewhere is not taken for its word.
 in_private_namespace() {
