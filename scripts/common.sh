@@ -87,11 +87,47 @@ following() {
   if [[ $last == z ]]; then echo "${1}a"; else echo "${1%?}$(tr a-y b-z <<<"$last")"; fi
 }
 
-# stage_system VERSION SCHEMA SOURCE: puts zone data compiled from SOURCE into the system partition below $root.
+moment=1800014400 # 2027-01-15 12:00 UTC, in the winter after that change of rule
+
+# icu_zones ZONEINFO DIRECTORY: puts ICU's own zone data into DIRECTORY, but with Europe/Paris at the offset from UTC
+# that it has in the zone files ZONEINFO at that moment, the whole year.
+icu_zones() {
+  local hour
+  hour=$(TZDIR=$1 TZ=Europe/Paris date -d @$moment +%-H)
+  mkdir -p "$2"
+  # A zone is a number where it is the same as the zone of that number, and the name of each is in a list before.
+  derb -c -s - zoneinfo64.res | awk -v like="\"Etc/GMT-$((hour - 12))\"," '
+    /^    [A-Z]/ { section = $1; entry = -1 }
+    section == "Names{" && /^        "/ { number[$1] = ++entry }
+    section == "Zones{" && /^        [:{]/ {
+      same[++entry] = $1 == ":int" ? $3 : entry
+      paris = entry == number["\"Europe/Paris\","]
+      if (paris) print "        :int { " same[number[like]] " }"
+    }
+    !paris || /^    }/ { paris = 0; print }' >"$2/zoneinfo64.txt"
+  genrb --quiet --destdir "$2" "$2/zoneinfo64.txt"
+  rm "$2/zoneinfo64.txt"
+}
+
+# Asks ICU for the time of that moment in Europe/Paris: run by /usr/bin/python3, of the package python3-icu, with
+# icu_environment. It takes the zone data that the link leads to, or those of the system partition without it.
+# shellcheck disable=SC2034 # scripts use it
+icu_clock="import icu
+clock = icu.SimpleDateFormat('HH:mm', icu.Locale.getUK())
+clock.setTimeZone(icu.TimeZone.createTimeZone('Europe/Paris'))
+print(clock.format($moment.0))"
+# shellcheck disable=SC2034
+icu_environment=(ICU_DATA=/usr/share/icu ICU_TIMEZONE_FILES_DIR=/var/db/timezone/icutz)
+
+# stage_system VERSION SCHEMA SOURCE: puts zone data compiled from SOURCE into the system partition below $root, for the
+# C library and for ICU.
 stage_system() {
+  local icu
+  icu=$(derb --version 2>&1 | sed -n 's/.*ICU version \([0-9]*\).*/icudt\1l/p')
   rm -rf "${root?}/usr/share/zoneinfo.default"
-  mkdir -p "$root/usr/share/zoneinfo.default" "$root/usr/share/icu"
+  mkdir -p "$root/usr/share/zoneinfo.default"
   zic -d "$root/usr/share/zoneinfo.default" "$3"
+  icu_zones "$root/usr/share/zoneinfo.default" "$root/usr/share/icu/$icu"
   echo "$1" >"$root/usr/share/zoneinfo.default/+VERSION"
   echo "$2" >"$root/usr/share/icu/icutzformat.txt"
 }
@@ -99,8 +135,10 @@ stage_system() {
 # stage_dataset VERSION SCHEMA SOURCE: installs a dataset below $root as an update installer does, its name last.
 stage_dataset() {
   local dataset=/var/db/timezone/tz/$1
-  mkdir -p "${root?}$dataset/zoneinfo" "$root$dataset/icutz"
+  mkdir -p "${root?}$dataset/zoneinfo"
   zic -d "$root$dataset/zoneinfo" "$3"
-  touch "$root$dataset/icutz/icutz$2.dat"
+  icu_zones "$root$dataset/zoneinfo" "$root$dataset/icutz"
+  # ICU opens the one name; the other says which schema it has.
+  ln -f "$root$dataset/icutz/zoneinfo64.res" "$root$dataset/icutz/icutz$2.dat"
   ln -sfn "$dataset" "$root/var/db/timezone/tz_latest"
 }
