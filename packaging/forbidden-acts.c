@@ -29,8 +29,8 @@ static bool report(const char *act, const char *object, bool works) {
   return works;
 }
 
-static bool opens(const char *path, int flags) {
-  const int file = open(path, flags | O_NONBLOCK | O_CLOEXEC, 04700);
+static bool opens(const char *path, int flags, mode_t mode) {
+  const int file = open(path, flags | O_NONBLOCK | O_CLOEXEC, mode);
   return file >= 0 && close(file) == 0;
 }
 
@@ -45,7 +45,7 @@ static void use_files(void) {
   for (size_t i = 0; i < LENGTH(directories); ++i) {
     char path[64];
     snprintf(path, sizeof path, "%s/new", directories[i]);
-    if (report("create ", path, opens(path, O_CREAT | O_EXCL | O_WRONLY))) unlink(path);
+    if (report("create ", path, opens(path, O_CREAT | O_EXCL | O_WRONLY, 0600))) unlink(path);
   }
   static const char *const devices[] = {"/disk",
                                         "/dev/console",
@@ -53,17 +53,18 @@ static void use_files(void) {
                                         "/proc/sysrq-trigger",
                                         "/proc/sys/kernel/core_pattern",
                                         "/sys/module/kernel/parameters/panic"};
-  for (size_t i = 0; i < LENGTH(devices); ++i) report("write to ", devices[i], opens(devices[i], O_WRONLY));
-  report("read ", "/etc/shadow", opens("/etc/shadow", O_RDONLY));
+  for (size_t i = 0; i < LENGTH(devices); ++i) report("write to ", devices[i], opens(devices[i], O_WRONLY, 0));
+  report("read ", "/etc/shadow", opens("/etc/shadow", O_RDONLY, 0));
 }
 
 static void leave_traps(void) {
   struct stat status;
   report("create a set-user-ID file", "",
-         opens(work, O_CREAT | O_WRONLY) && stat(work, &status) == 0 && (status.st_mode & S_ISUID));
+         opens(work, O_CREAT | O_WRONLY, 04700) && stat(work, &status) == 0 && (status.st_mode & S_ISUID));
+  unlink(work);
   static const char capabilities[20] = {1, 0, 0, 2, 1};
   report("give a file capabilities", "",
-         opens(work, O_CREAT | O_WRONLY) && setxattr(work, "security.capability", capabilities, 20, 0) == 0);
+         opens(work, O_CREAT | O_WRONLY, 0600) && setxattr(work, "security.capability", capabilities, 20, 0) == 0);
   unlink(work);
   report("create the node of a disk", "", mknod(work, S_IFBLK | 0600, makedev(7, 0)) == 0);
   unlink(work);
