@@ -78,13 +78,13 @@ following() {
   if [[ $last == z ]]; then echo "${1}a"; else echo "${1%?}$(tr a-y b-z <<<"$last")"; fi
 }
 
-moment=1800014400 # 2027-01-15 12:00 UTC, in the winter after that change of rule
+moment=@1800014400 # 2027-01-15 12:00 UTC, in the winter after that change of rule
 
 # icu_zones ZONEINFO DIRECTORY: puts ICU's own zone data into DIRECTORY, but with Europe/Paris at the offset from UTC
 # that it has in the zone files ZONEINFO at that moment, the whole year.
 icu_zones() {
   local hour
-  hour=$(TZDIR=$1 TZ=Europe/Paris date -d @$moment +%-H)
+  hour=$(TZDIR=$1 TZ=Europe/Paris date -d $moment +%-H)
   mkdir -p "$2"
   # A zone is a number where it is the same as the zone of that number, and the name of each is in a list before.
   derb -c -s - zoneinfo64.res | awk -v like="\"Etc/GMT-$((hour - 12))\"," '
@@ -106,7 +106,7 @@ icu_zones() {
 icu_clock="import icu
 clock = icu.SimpleDateFormat('HH:mm', icu.Locale.getUK())
 clock.setTimeZone(icu.TimeZone.createTimeZone('Europe/Paris'))
-print(clock.format($moment.0))"
+print(clock.format(${moment#@}.0))"
 # shellcheck disable=SC2034
 icu_environment=(ICU_DATA=/usr/share/icu ICU_TIMEZONE_FILES_DIR=/var/db/timezone/icutz)
 
