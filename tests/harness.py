@@ -1,20 +1,6 @@
 """Stages a situation, runs the program once as a boot does, and compares what it leaves on disk.
 
-A situation is a list of statements, separated by ", ". Their paths are relative to /var/db/timezone:
-  system VERSION [SCHEMA]    the system partition's data; "-" leaves the version or the schema out
-  dataset VERSION [SCHEMA]   an installed dataset; "-" leaves the ICU data file out
-  live system                the zoneinfo link points to the system partition, no icutz link
-  live VERSION               both links point to the dataset
-  latest VERSION             tz_latest points to the dataset
-  marker                     an empty needs_cleanup
-  record TEXT                TZVersionDiffRecord holds the text
-  PATH > TARGET              a link; "@" at the front of a target stands for /var/db/timezone/tz/
-  PATH = TEXT                a file; a backslash escape, such as \\n, \\0 or \\xff, stands for a byte
-  PATH /                     an empty directory
-  PATH fifo                  a FIFO
-  PATH mode MODE             the permissions of what is there, in octal digits
-  - PATH                     nothing at the path
-A schema that is not given is 44l. Each situation begins as DEFAULT.
+boots.txt explains the notation.
 """
 
 import os
@@ -76,10 +62,10 @@ def entries(statements):
     """Yields path, kind and text of each statement; the kind of nothing at the path is empty."""
     for statement in (full for short in statements.split(", ") for full in in_full(short) if full):
         path, _, value = statement.partition(" ")
-        if path == "-":
-            path, value = value, ""
         kind, _, text = value.partition(" ")
-        if kind not in ("", "/", "=", ">", "fifo", "mode"):
+        if path == "-":
+            path, kind, text = value, "", ""
+        elif kind not in ("/", "=", ">", "fifo", "mode"):
             raise ValueError(f"no such statement: {statement}")
         text = f"{STATE}tz/{text[1:]}" if text.startswith("@") else text
         yield os.path.normpath(os.path.join(STATE, path)), kind, text
@@ -172,5 +158,8 @@ def check_boot(situation, changes, warnings=None, status=0, command=RELEASE):
     ):
         expected["warnings"] = outcome.warnings
     differing = sorted(key for key in expected | seen if expected.get(key) != seen.get(key))
-    report = [f"{k}\n  expected: {expected.get(k)}\n  seen:     {seen.get(k)}" for k in differing]
+    report = [
+        f"{k}\n  expected: {expected.get(k, 'nothing')}\n  seen:     {seen.get(k, 'nothing')}"
+        for k in differing
+    ]
     assert not differing, "\n" + "\n".join(report)

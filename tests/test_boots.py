@@ -1,5 +1,6 @@
 """Runs every boot of boots.txt."""
 
+import re
 from pathlib import Path
 
 import pytest
@@ -8,20 +9,24 @@ import harness
 
 
 def read_boots():
-    """Yields the name and the situation of each boot, and the lines on its outcome."""
+    """Returns the situation of each boot and the lines on its outcome, by name."""
+    boots = {}
     text = Path(__file__).with_name("boots.txt").read_text(encoding="utf-8")
-    text = "\n".join(line for line in text.split("\n") if not line.startswith("#"))
-    for paragraph in filter(None, text.replace("\n      ", " ").strip().split("\n\n")):
-        first, *lines = paragraph.strip().split("\n  ")
+    text = re.sub(r"^#.*\n", "", text, flags=re.MULTILINE)
+    for paragraph in re.split(r"\n\s*\n", re.sub(r"\n {3,}", " ", text).strip()):
+        first, *lines = paragraph.split("\n  ")
         name, _, situation = first.partition(": ")
         cases = [line[1:].strip(" ") for line in lines if line.startswith("|")]
         for case in cases or ["*"]:
+            full_name = f"{name}: {case}" if cases else name
+            assert full_name not in boots, f"two boots in boots.txt have the name {full_name}"
             outcome = [line.replace("*", case) for line in lines if not line.startswith("|")]
-            yield f"{name}: {case}" if cases else name, situation.replace("*", case), outcome
+            boots[full_name] = situation.replace("*", case), outcome
+    return boots
 
 
 BINARIES = {"release": harness.RELEASE, "sanitized": harness.SANITIZED}
-BOOTS = {name: boot for name, *boot in read_boots()}
+BOOTS = read_boots()
 
 
 @pytest.mark.parametrize("binary", BINARIES)
@@ -31,6 +36,7 @@ def test_boot(name, binary):
     rows = {"->": [], "!": [], "exit": ["0"]}
     for line in lines:
         kind, _, rest = line.partition(" ")
+        assert kind in rows, f"no such line: {line}"
         rows[kind].append(rest)
     changes, status = ", ".join(rows["->"]), int(rows["exit"][-1])
     harness.check_boot(situation, changes, rows["!"], status, BINARIES[binary])

@@ -30,7 +30,7 @@ FAULTS = ["error=EIO", "error=EIO+", "error=ENOENT", "error=ENOENT+", "signal=KI
 OWN = [STATE + name for name in ("zoneinfo", "icutz", "localtime", "needs_cleanup")]
 OWN += [STATE + "TZVersionDiffRecord", "/var/db/icutz", "/var/db/icu"]
 ZONES = [f"{STATE}zoneinfo/{zone}" for zone in ("Europe/Paris", "America/Los_Angeles")]
-CANNOT_FAIL = ["brk", "exit_group", "futex"]  # with an errno value
+NEVER_FAIL = ["brk", "exit_group", "futex"]  # None of them fails by an errno value.
 WARNINGS = {
     "symlink": "create_symlink: from {1} to {0}",
     "readlink": "read_symlink: {0}",
@@ -50,7 +50,8 @@ def traced_run(*injection, command=harness.RELEASE):
 
 def warning_of(name, lines):
     """Returns the warning of the last of these calls if it fails, without the text of errno."""
-    if any('needs_cleanup", O_RDWR' in line for line in lines):
+    # The open of the marker is followed by two calls on it.
+    if any('needs_cleanup", O_RDWR' in line for line in lines[-3:]):
         return f"Cannot touch file {STATE}needs_cleanup"
     strings = re.findall('"([^"]*)"', lines[-1])
     if name == "unlink" and not strings[0].endswith(("/zoneinfo", "/icutz")):
@@ -67,9 +68,8 @@ def calls_of_a_run():
     for end, line in enumerate(lines, 1):
         name = line.partition("(")[0]
         counts[name] += 1
-        if end > start and name not in CANNOT_FAIL:
-            # The open of the marker is followed by two calls on it.
-            calls.append(Call(name, line, counts[name], warning_of(name, lines[end - 3 : end])))
+        if end > start and name not in NEVER_FAIL:
+            calls.append(Call(name, line, counts[name], warning_of(name, lines[:end])))
     return calls
 
 
