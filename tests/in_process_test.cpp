@@ -115,6 +115,7 @@ TEST(Failures, RaiseTheErrnoOfTheCallThoughTheWarningFails) {
   EXPECT_EQ(raised_by([] { fs::remove("/dev/null/x"); }), ENOTDIR);
   EXPECT_EQ(raised_by([] { fs::remove(""); }), 0);
   EXPECT_EQ(raised_by([] { fs::read_symlink("/"); }), EINVAL);
+  EXPECT_EQ(raised_by([] { fs::read_symlink("/dev/null/x"); }), ENOTDIR);
   EXPECT_EQ(raised_by([] { fs::create_symlink("target", "/"); }), EEXIST);
   EXPECT_EQ(raised_by([] { fs::create_symlink("target", "/no/such/link"); }), ENOENT);
   EXPECT_EQ(raised_by([] { boot::dataset_path_from_link("/elsewhere"); }), -1);

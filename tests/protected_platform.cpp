@@ -10,6 +10,6 @@ int open_dprotected_np(const char* path, int flags, int protection_class, int dp
   va_start(arguments, dpflags);
   const int descriptor = ::open(path, flags, va_arg(arguments, mode_t));
   va_end(arguments);
-  ::fcntl(descriptor, F_SETPROTECTIONCLASS, 1000 + protection_class + dpflags);
+  ::fcntl(descriptor, F_SETPROTECTIONCLASS, 1000 + protection_class + 100 * dpflags);
   return descriptor;
 }

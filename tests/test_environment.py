@@ -13,12 +13,14 @@ from test_faults import traced_run
 RESET = f"localtime > {STATE}zoneinfo/America/Los_Angeles"
 SWITCH = "dataset 2021b.1.0, live 2021b.1.0, dataset 2022a.1.0, latest 2022a.1.0, localtime ="
 SWITCHED = f"live 2022a.1.0, marker, record 2021b.1.0_2022a.1.0, {RESET}"
+FIFO = SWITCHED.replace("record 2021b.1.0_2022a.1.0", "TZVersionDiffRecord fifo")
+READ_ONLY = "mount -o remount,ro"
 SPARSE = "sparse() { : >$1; truncate -s 100G $1; }; sparse"
 FULL = "nr_inodes=$(($(stat -f -c %c-%d /var)))"
 
 # Scripts that run the program, with what becomes of SWITCH and the exit status.
 ENVIRONMENTS = {
-    "exec $0 <&-": (SWITCHED, 0),
+    "[[ $($0 2>&1 <&- | wc -l) == 2 ]]": (SWITCHED, 0),
     "exec $0 >&-": (SWITCHED, 0),
     "exec $0 2>&-": (SWITCHED, 0),
     "exec $0 <&- >&- 2>&-": (SWITCHED, 0),
@@ -27,16 +29,20 @@ ENVIRONMENTS = {
     "ulimit -f 0; exec $0": (SWITCHED.replace(" 2021b.1.0_2022a.1.0", ""), 0),
     "exec $0 --help -x ''": (SWITCHED, 0),
     "p=$(realpath $0); mkdir /var/gone; cd /var/gone; rmdir /var/gone; exec $p": (SWITCHED, 0),
-    f"umask 027; $0; [[ $(stat -c %a {STATE}[Tn]* | uniq) == 640 ]]": (SWITCHED, 0),
+    f"umask 0; $0; [[ $(stat -c %a {STATE}[Tn]* | uniq) == 666 ]]": (SWITCHED, 0),
     # Without its files the system has no schema and no version, and no directory is walked: all fits.
     "ulimit -n 3; exec $0": (f"live 2022a.1.0, {RESET}", 0),
+    "ulimit -n 4; exec $0 <&-": (SWITCHED, 0),
+    f"r={STATE}TZVersionDiffRecord; mkfifo $r; exec 3<>$r; $0 3>&-; ! read -rt 0 -u 3": (FIFO, 0),
+    f"{READ_ONLY} /usr/share; $0; s=$?; mount -o remount,rw /usr/share; exit $s": (SWITCHED, 0),
     f"{SPARSE} {SYSTEM}/+VERSION; $0; s=$?; echo 2021a >{SYSTEM}/+VERSION; exit $s": (SWITCHED, 0),
     f"{SPARSE} {ICU_FORMAT}; $0; s=$?; echo 44l >{ICU_FORMAT}; exit $s": (
         f"live system, marker, {RESET}",
         0,
     ),
     f"rm -r {STATE}; exec $0": ("- .", 1),
-    "mount -o remount,ro /var; $0; s=$?; mount -o remount,rw /var; exit $s": ("", 1),
+    f"rm {STATE}tz_latest {STATE}localtime; {READ_ONLY} /var; $0; s=$?; "
+    "mount -o remount,rw /var; exit $s": ("- tz_latest, - localtime", 1),
     f"rm {STATE}localtime; mount -o remount,{FULL} /var; $0; s=$?; "
     "mount -o remount,nr_inodes=99999 /var; exit $s": ("- localtime, live 2022a.1.0", 1),
 }
@@ -48,11 +54,18 @@ def test_environment(script):
     harness.check_boot(SWITCH, changes, None, status, ["bash", "-c", script, *harness.RELEASE])
 
 
-@pytest.mark.parametrize("version, status", [("7", 0), ("a", 0), ("2021a", 0), ("7a", 1)])
+@pytest.mark.parametrize(
+    "version, status", [("7", 0), ("a", 0), ("2021a", 0), ("7a", 1), ("77a", 0)]
+)
 def test_a_version_of_megabytes_does_not_stop_the_local_time_repair(version, status):
     for byte in "7a":
         version = version.replace(byte, byte * (8 << 20))
     harness.check_boot(f"system {version}, - localtime", RESET, None, status)
+
+
+@pytest.mark.parametrize("version", [f"{'2021a':>8192}{'z':>4097}", f"{'2021a':>4097}"])
+def test_a_version_file_of_several_buffers(version):
+    harness.check_boot(f"{SYSTEM}/+VERSION = {version}, dataset 2021a.1.0, live 2021a.1.0", "", [])
 
 
 def test_without_memory_the_local_time_is_repaired():
@@ -84,8 +97,10 @@ def test_a_tree_below_the_icu_directory_is_not_walked():
 def test_a_platform_with_protection_classes_gets_them():
     harness.stage("system 2022a, dataset 2021b.1.0, live 2021b.1.0")
     trace = traced_run(command=["build/dev/tests/tzreconcile"])[1]
-    for path, number in (("", 4), ("tz/", 4), ("needs_cleanup", 1004)):
-        assert re.search(f'"{STATE}{path}".* = 3\nfcntl\\(3, 0x40 .*, {number:#x}\\)', trace), path
+    for path, number in (('"', 4), ('tz/"', 4), ('needs_cleanup", O_RDWR|O_CREAT, 0666', 1004)):
+        assert re.search(
+            f'"{STATE}{re.escape(path)}.* = 3\nfcntl\\(3, 0x40 .*, {number:#x}\\)', trace
+        ), path
 
 
 def test_in_process():

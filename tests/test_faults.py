@@ -22,6 +22,7 @@ SITUATIONS = {
     "dataset 2021b.1.0, zoneinfo > @2021b.1.0/zoneinfo, /var/db/icutz > @2021b.1.0/icutz, "
     "tz_latest > /elsewhere, marker, /var/db/icu =": 2,
     "localtime > /usr/share/zoneinfo/Europe/Paris": 2,
+    "localtime > /usr/share/zoneinfo/No/Such": 2,
     # The latest dataset is older than the system's: one boot switches to it, the next one rejects it.
     "system 2022z, dataset 2021b.1.0, live 2021b.1.0, dataset 2022a.1.0, latest 2022a.1.0": 3,
 }
