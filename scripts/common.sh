@@ -48,7 +48,7 @@ run_pytest() {
 # blank in its name.
 package() {
   local tree
-  need cmake debhelper dpkg-dev g++ git
+  need build-essential cmake debhelper git
   tree=$(mktemp -d)
   rm -rf "$1"
   mkdir -p "$1" "$tree/source"
