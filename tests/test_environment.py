@@ -21,7 +21,6 @@ FULL = "nr_inodes=$(($(stat -f -c %c-%d /var)))"
 # Scripts that run the program, with what becomes of SWITCH and the exit status.
 ENVIRONMENTS = {
     "[[ $($0 2>&1 <&- | wc -l) == 2 ]]": (SWITCHED, 0),
-    "exec $0 >&-": (SWITCHED, 0),
     "exec $0 2>&-": (SWITCHED, 0),
     "exec $0 <&- >&- 2>&-": (SWITCHED, 0),
     "exec $0 2>/dev/full": (SWITCHED, 0),
