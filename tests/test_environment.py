@@ -14,7 +14,8 @@ RESET = f"localtime > {STATE}zoneinfo/America/Los_Angeles"
 SWITCH = "dataset 2021b.1.0, live 2021b.1.0, dataset 2022a.1.0, latest 2022a.1.0, localtime ="
 SWITCHED = f"live 2022a.1.0, marker, record 2021b.1.0_2022a.1.0, {RESET}"
 FIFO = SWITCHED.replace("record 2021b.1.0_2022a.1.0", "TZVersionDiffRecord fifo")
-READ_ONLY = "mount -o remount,ro"
+# Without the options that the mount has, since a user namespace knows its owner by another number.
+REMOUNT = "mount --options-source disable -o remount"
 SPARSE = "sparse() { : >$1; truncate -s 100G $1; }; sparse"
 FULL = "nr_inodes=$(($(stat -f -c %c-%d /var)))"
 
@@ -33,17 +34,17 @@ ENVIRONMENTS = {
     "ulimit -n 3; exec $0": (f"live 2022a.1.0, {RESET}", 0),
     "ulimit -n 4; exec $0 <&-": (SWITCHED, 0),
     f"r={STATE}TZVersionDiffRecord; mkfifo $r; exec 3<>$r; $0 3>&-; ! read -rt 0 -u 3": (FIFO, 0),
-    f"{READ_ONLY} /usr/share; $0; s=$?; mount -o remount,rw /usr/share; exit $s": (SWITCHED, 0),
+    f"{REMOUNT},ro /usr/share && $0; s=$?; {REMOUNT},rw /usr/share; exit $s": (SWITCHED, 0),
     f"{SPARSE} {SYSTEM}/+VERSION; $0; s=$?; echo 2021a >{SYSTEM}/+VERSION; exit $s": (SWITCHED, 0),
     f"{SPARSE} {ICU_FORMAT}; $0; s=$?; echo 44l >{ICU_FORMAT}; exit $s": (
         f"live system, marker, {RESET}",
         0,
     ),
     f"rm -r {STATE}; exec $0": ("- .", 1),
-    f"rm {STATE}tz_latest {STATE}localtime; {READ_ONLY} /var; $0; s=$?; "
-    "mount -o remount,rw /var; exit $s": ("- tz_latest, - localtime", 1),
-    f"rm {STATE}localtime; mount -o remount,{FULL} /var; $0; s=$?; "
-    "mount -o remount,nr_inodes=99999 /var; exit $s": ("- localtime, live 2022a.1.0", 1),
+    f"rm {STATE}tz_latest {STATE}localtime; {REMOUNT},ro /var && $0; s=$?; "
+    f"{REMOUNT},rw /var; exit $s": ("- tz_latest, - localtime", 1),
+    f"rm {STATE}localtime; {REMOUNT},{FULL} /var && $0; s=$?; "
+    f"{REMOUNT},nr_inodes=99999 /var; exit $s": ("- localtime, live 2022a.1.0", 1),
 }
 
 
