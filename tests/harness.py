@@ -105,7 +105,7 @@ def stage(situation):
 
 
 def read_disk():
-    """Returns all that is below /var and /usr/share: path to "> TARGET", "= TEXT", "/" or "fifo"."""
+    """Returns all below /var and /usr/share: path to "> TARGET", "= TEXT", "/" or "fifo"."""
     disk = {}
     for covered in COVERED:
         for directory, directories, files in os.walk(covered):

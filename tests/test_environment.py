@@ -30,7 +30,7 @@ ENVIRONMENTS = {
     "exec $0 --help -x ''": (SWITCHED, 0),
     "p=$(realpath $0); mkdir /var/gone; cd /var/gone; rmdir /var/gone; exec $p": (SWITCHED, 0),
     f"umask 0; $0; [[ $(stat -c %a {STATE}[Tn]* | uniq) == 666 ]]": (SWITCHED, 0),
-    # Without its files the system has no schema and no version, and no directory is walked: all fits.
+    # Without its files the system has no schema and no version; no directory is walked: all fits.
     "ulimit -n 3; exec $0": (f"live 2022a.1.0, {RESET}", 0),
     "ulimit -n 4; exec $0 <&-": (SWITCHED, 0),
     f"r={STATE}TZVersionDiffRecord; mkfifo $r; exec 3<>$r; $0 3>&-; ! read -rt 0 -u 3": (FIFO, 0),

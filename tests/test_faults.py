@@ -23,7 +23,7 @@ SITUATIONS = {
     "tz_latest > /elsewhere, marker, /var/db/icu =": 2,
     "localtime > /usr/share/zoneinfo/Europe/Paris": 2,
     "localtime > /usr/share/zoneinfo/No/Such": 2,
-    # The latest dataset is older than the system's: one boot switches to it, the next one rejects it.
+    # The latest dataset is older than the system's: one boot switches to it, the next rejects it.
     "system 2022z, dataset 2021b.1.0, live 2021b.1.0, dataset 2022a.1.0, latest 2022a.1.0": 3,
 }
 # A "+" is for all calls of the name from there on.
@@ -83,7 +83,7 @@ def check_failure(call, outcome, error):
     tolerated = error == os.strerror(2) and call.name in ("unlink", "readlink")
     if call.warning and not tolerated:
         assert f"{call.warning}: {error}" in outcome.warnings
-    # Status 1 stands for a zoneinfo link of the fallback, or a local time link, that is not created.
+    # Status 1: the zoneinfo link of the fallback or the local time link could not be created.
     text = "\n".join(outcome.warnings)
     no_zoneinfo = f"create_symlink: from {STATE}zoneinfo to {SYSTEM}: "
     no_localtime = f"create_symlink: from {STATE}localtime to {ZONES[1]}: "
@@ -93,7 +93,7 @@ def check_failure(call, outcome, error):
 
 
 def check_recovery(before, boots):
-    """Boots until all is settled. Returns whether the ICU link still points to what was live before."""
+    """Boots until all is settled. Returns whether the ICU link still points to what was live."""
     for _ in range(boots):
         harness.run()
     settled = harness.read_disk()
