@@ -39,25 +39,25 @@ build() {
 # run_pytest ARGUMENT...: runs pytest with a worker for each processor core, each in a sandbox of its own.
 run_pytest() {
   need python3-pytest python3-pytest-xdist util-linux
-  tests/sandbox /usr/bin/python3 -B -m pytest --quiet --tb short -p no:cacheprovider --override-ini testpaths=tests \
+  tests/sandbox /usr/bin/python3 -B -m pytest --quiet --tb short -p no:cacheprovider \
+    --basetemp build/pytest --override-ini testpaths=tests \
     --dist load --tx "$(nproc)*popen//python=tests/sandbox /usr/bin/python3 -B" "$@"
 }
 
 # package DIRECTORY [OPTION...]: builds the Debian packages of the tracked files, with these options of
 # dpkg-buildpackage, into DIRECTORY. They are built elsewhere: debhelper fails below a directory with a
 # blank in its name.
-package() {
-  local tree
+package() (
   need build-essential cmake debhelper git
   tree=$(mktemp -d)
+  trap 'rm -rf "$tree"' EXIT
   rm -rf "$1"
   mkdir -p "$1" "$tree/source"
   git ls-files -z | xargs -0 cp --parents -t "$tree/source"
   (cd "$tree/source" && dpkg-buildpackage --build=binary --no-sign "${@:2}") >"$1/log" 2>&1 ||
     die "the package was not built, see $1/log"
   mv "$tree"/*.deb "$1"
-  rm -rf "$tree"
-}
+)
 
 # in_sandbox: whether /var and /usr/share are those of tests/sandbox.
 in_sandbox() { grep -q '^tzreconcile-sandbox /var ' /proc/self/mounts; }

@@ -6,6 +6,7 @@
 #include <functional>
 #include <regex>
 #include <stdexcept>
+#include <string>
 
 #include "boot/state.hpp"
 #include "dataset/icu.hpp"

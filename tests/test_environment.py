@@ -34,16 +34,16 @@ ENVIRONMENTS = {
     "ulimit -n 3; exec $0": (f"live 2022a.1.0, {RESET}", 0),
     "ulimit -n 4; exec $0 <&-": (SWITCHED, 0),
     f"r={STATE}TZVersionDiffRecord; mkfifo $r; exec 3<>$r; $0 3>&-; ! read -rt 0 -u 3": (FIFO, 0),
-    f"{REMOUNT},ro /usr/share && $0; s=$?; {REMOUNT},rw /usr/share; exit $s": (SWITCHED, 0),
+    f"{REMOUNT},ro /usr/share || exit; $0; s=$?; {REMOUNT},rw /usr/share; exit $s": (SWITCHED, 0),
     f"{SPARSE} {SYSTEM}/+VERSION; $0; s=$?; echo 2021a >{SYSTEM}/+VERSION; exit $s": (SWITCHED, 0),
     f"{SPARSE} {ICU_FORMAT}; $0; s=$?; echo 44l >{ICU_FORMAT}; exit $s": (
         f"live system, marker, {RESET}",
         0,
     ),
     f"rm -r {STATE}; exec $0": ("- .", 1),
-    f"rm {STATE}tz_latest {STATE}localtime; {REMOUNT},ro /var && $0; s=$?; "
+    f"rm {STATE}tz_latest {STATE}localtime; {REMOUNT},ro /var || exit 9; $0; s=$?; "
     f"{REMOUNT},rw /var; exit $s": ("- tz_latest, - localtime", 1),
-    f"rm {STATE}localtime; {REMOUNT},{FULL} /var && $0; s=$?; "
+    f"rm {STATE}localtime; {REMOUNT},{FULL} /var || exit 9; $0; s=$?; "
     f"{REMOUNT},nr_inodes=99999 /var; exit $s": ("- localtime, live 2022a.1.0", 1),
 }
 

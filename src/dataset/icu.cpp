@@ -47,10 +47,8 @@ void vrel_icu::read_schema_from_file_names() {
   if (!walk) {
     fs::warn_and_raise("tz_icu::initialize: fts_open of %s failed, %s", data_directory_.c_str(), std::strerror(errno));
   }
-  while (FTSENT* const entry = ::fts_read(walk.get())) {
-    if (!schema_.empty()) {
-      return;
-    }
+  FTSENT* entry = nullptr;
+  while (schema_.empty() && (entry = ::fts_read(walk.get())) != nullptr) {
     if (entry->fts_level != 1) {
       continue;
     }

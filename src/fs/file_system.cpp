@@ -27,7 +27,8 @@ class file {
   file(const file&) = delete;
   file& operator=(const file&) = delete;
 
-  /// Returns whether this is open and neither a FIFO, a socket nor a device. A directory may pass: using it fails.
+  /// Returns whether this is open and neither a FIFO, a socket nor a device. A directory passes, since reading it fails
+  /// with an errno value that says what is wrong.
   bool is_usable() const noexcept {
     struct stat status;
     return descriptor_ >= 0 && ::fstat(descriptor_, &status) == 0 &&
