@@ -23,11 +23,9 @@ FULL = "nr_inodes=$(($(stat -f -c %c-%d /var)))"
 ENVIRONMENTS = {
     "[[ $($0 2>&1 <&- | wc -l) == 2 ]]": (SWITCHED, 0),
     "exec $0 2>&-": (SWITCHED, 0),
-    "exec $0 <&- >&- 2>&-": (SWITCHED, 0),
     "exec $0 2>/dev/full": (SWITCHED, 0),
     "exec 2> >(exec true) && wait $! && exec $0": (SWITCHED, 0),
     "ulimit -f 0; exec $0": (SWITCHED.replace(" 2021b.1.0_2022a.1.0", ""), 0),
-    "exec $0 --help -x ''": (SWITCHED, 0),
     "p=$(realpath $0); mkdir /var/gone; cd /var/gone; rmdir /var/gone; exec $p": (SWITCHED, 0),
     f"umask 0; $0; [[ $(stat -c %a {STATE}[Tn]* | uniq) == 666 ]]": (SWITCHED, 0),
     # Without its files the system has no schema and no version; no directory is walked: all fits.
@@ -97,10 +95,9 @@ def test_a_tree_below_the_icu_directory_is_not_walked():
 def test_a_platform_with_protection_classes_gets_them():
     harness.stage("system 2022a, dataset 2021b.1.0, live 2021b.1.0")
     trace = traced_run(command=["build/dev/tests/tzreconcile"])[1]
-    for path, number in (('"', 4), ('tz/"', 4), ('needs_cleanup", O_RDWR|O_CREAT, 0666', 1004)):
-        assert re.search(
-            f'"{STATE}{re.escape(path)}.* = 3\nfcntl\\(3, 0x40 .*, {number:#x}\\)', trace
-        ), path
+    calls = [('"', 4), ('tz/"', 4), ('needs_cleanup", O_RDWR.O_CREAT, 0666', 1004)]
+    opens = (f'"{STATE}{p}[^\n]* = 3\nfcntl\\(3, 0x40 [^\n]*, {n:#x}\\)' for p, n in calls)
+    assert re.search(".*".join(opens), trace, re.DOTALL), trace
 
 
 def test_in_process():
