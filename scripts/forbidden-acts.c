@@ -41,7 +41,8 @@ static bool ends(pid_t child) {
 
 static void use_files(void) {
   static const char *const directories[] = {
-      "", "/etc", "/usr", "/root", "/home", "/run", "/run/systemd/system", "/tmp", "/dev/shm", "/var/lib"};
+      "",     "/etc",     "/usr",     "/root",           "/home", "/run", "/run/systemd/system",
+      "/tmp", "/dev/shm", "/var/lib", "/run/tzreconcile"};
   for (size_t i = 0; i < LENGTH(directories); ++i) {
     char path[64];
     snprintf(path, sizeof path, "%s/new", directories[i]);
