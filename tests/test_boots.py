@@ -1,42 +1,142 @@
-"""Runs every boot of boots.txt."""
+"""Stages each situation of boots.txt, boots, and compares all that the boot leaves behind.
 
+boots.txt explains the notation.
+"""
+
+import os
 import re
+import shutil
+import subprocess
 from pathlib import Path
 
 import pytest
 
-import harness
+STATE = "/var/db/timezone/"
+COVERED = ["/var", "/usr/share"]
+BINARIES = {
+    "release": os.environ.get("TZRECONCILE", "build/release/tzreconcile").split(),
+    "sanitized": ["build/dev/tzreconcile"],
+}
+IN_2041 = 2240611200  # Seconds that do not fit into 32 bits.
+ZONES = "{0}/Europe/Paris = TZif, {0}/America/Los_Angeles = TZif, "
+DATASET = ZONES.format("tz/{0}/zoneinfo") + "tz/{0}/icutz/icutz{1}.dat ="
+SHORT = {
+    "system": ZONES.format("/usr/share/zoneinfo.default")
+    + "/usr/share/zoneinfo.default/+VERSION = {0}\\n, /usr/share/icu/icutzformat.txt = {1}\\n",
+    "dataset": DATASET,
+    "live": f"{DATASET}, zoneinfo > @{{0}}/zoneinfo, icutz > @{{0}}/icutz",
+    "live system": "zoneinfo > /usr/share/zoneinfo.default, icutz -",
+    "latest": f"{DATASET}, tz_latest > @{{0}}",
+    "marker": "needs_cleanup =",
+    "record": "TZVersionDiffRecord = {0}",
+}
+DEFAULT = "system 2021a, live system, localtime > /var/db/timezone/zoneinfo/Europe/Paris"
+
+mounts = Path("/proc/self/mounts").read_text()
+if not all(f"tzreconcile-sandbox {path} " in mounts for path in COVERED):
+    raise SystemExit("run scripts/test: outside its sandbox this would clear /var")
+os.umask(0o022)
+
+
+def in_full(statement):
+    """Returns the statements on paths that a statement stands for."""
+    name, *words = statement.split(" ")
+    full = SHORT.get(statement) or SHORT.get(name)
+    return full.format(*words, "44l").split(", ") if full else [statement]
+
+
+def create(path, kind, text=""):
+    """Puts what the statement says in place of what is at the path."""
+    if kind == "mode":
+        path.chmod(int(text, 8))
+        return
+    if path.is_dir() and not path.is_symlink():
+        shutil.rmtree(path)
+    path.unlink(missing_ok=True)
+    path.parent.mkdir(parents=True, exist_ok=True)
+    match kind:
+        case ">":
+            path.symlink_to(text.replace("@", STATE + "tz/"))
+        case "=":
+            path.write_bytes(text.encode().decode("unicode_escape").encode("latin-1"))
+            os.utime(path, (IN_2041, IN_2041))
+        case "/":
+            path.mkdir()
+        case "fifo":
+            os.mkfifo(path)
+        case _:
+            assert kind == "-", f"no such statement: {path} {kind} {text}"
+
+
+def stage(situation):
+    for path in [path for covered in COVERED for path in Path(covered).iterdir()]:
+        create(path, "-")
+    for statement in f"tz /, {DEFAULT}, {situation}".split(", "):
+        for full in filter(None, in_full(statement)):
+            path, *rest = full.split(" ", 2)
+            create(Path(STATE, path), *rest)
+
+
+def read_disk():
+    """Returns what is below /var and /usr/share, by path, in the notation of boots.txt."""
+    disk = {}
+    for path in [path for covered in COVERED for path in Path(covered).rglob("*")]:
+        if path.is_symlink():
+            disk[str(path)] = f"> {os.readlink(path)}"
+        elif path.is_file():
+            disk[str(path)] = f"= {path.read_text('latin-1')}"
+        else:
+            disk[str(path)] = "/" if path.is_dir() else "fifo"
+    return disk
+
+
+def run(command=BINARIES["release"], **options):
+    """Runs the program, or a command that ends in it, with the options of subprocess.run.
+
+    Returns the exit status and the lines on standard error.
+    """
+    defaults = {"stdin": subprocess.DEVNULL, "stderr": subprocess.PIPE, "timeout": 10}
+    result = subprocess.run(command, encoding="latin-1", **defaults | options)
+    return result.returncode, (result.stderr or "").splitlines()
+
+
+def check_boot(situation, changes, warnings, status, command=BINARIES["release"]):
+    """Asserts that a boot makes just these changes and gives these warnings; any, if None.
+
+    A warning may leave out the text of errno.
+    """
+    stage(f"{situation}, {changes}")
+    expected = {"exit": status, "warnings": warnings} | read_disk()
+    stage(situation)
+    os.utime(STATE, (0, 0))
+    status, lines = run(command)
+    texts = [line.removeprefix("tzreconcile: ") for line in lines]
+    texts = [text if text in (warnings or []) else text.rpartition(": ")[0] for text in texts]
+    seen = {"exit": status, "warnings": None if warnings is None else texts} | read_disk()
+    assert seen == expected
+    if not changes and not lines:
+        assert os.stat(STATE).st_mtime == 0, "a quiet boot has written to the state directory"
 
 
 def read_boots():
-    """Returns the situation of each boot and the lines on its outcome, by name."""
-    boots = {}
-    text = Path(__file__).with_name("boots.txt").read_text(encoding="utf-8")
+    """Yields name, situation, changes, warnings and exit status of each boot."""
+    text = Path(__file__).with_name("boots.txt").read_text()
     text = re.sub(r"^#.*\n", "", text, flags=re.MULTILINE)
-    for paragraph in re.split(r"\n\s*\n", re.sub(r"\n {3,}", " ", text).strip()):
+    for paragraph in re.split(r"\n\n+", re.sub(r"\n {3,}", " ", text).strip()):
         first, *lines = paragraph.split("\n  ")
         name, _, situation = first.partition(": ")
-        cases = [line[1:].strip(" ") for line in lines if line.startswith("|")]
-        for case in cases or ["*"]:
-            full_name = f"{name}: {case}" if cases else name
-            assert full_name not in boots, f"two boots in boots.txt have the name {full_name}"
-            outcome = [line.replace("*", case) for line in lines if not line.startswith("|")]
-            boots[full_name] = situation.replace("*", case), outcome
-    return boots
-
-
-BINARIES = {"release": harness.RELEASE, "sanitized": harness.SANITIZED}
-BOOTS = read_boots()
+        rows = {"->": [], "!": [], "exit": [], "|": []}
+        for kind, _, rest in (line.partition(" ") for line in lines):
+            rows[kind].append(rest)
+        for case in " | ".join(rows["|"] or ["*"]).split(" | "):
+            boot = situation, ", ".join(rows["->"]), *rows["!"]
+            situation_, changes, *warnings = (part.replace("*", case) for part in boot)
+            status = int((rows["exit"] or ["0"])[0])
+            yield f"{name}: {case}", situation_, changes, warnings, status
 
 
 @pytest.mark.parametrize("binary", BINARIES)
-@pytest.mark.parametrize("name", BOOTS)
-def test_boot(name, binary):
-    situation, lines = BOOTS[name]
-    rows = {"->": [], "!": [], "exit": ["0"]}
-    for line in lines:
-        kind, _, rest = line.partition(" ")
-        assert kind in rows, f"no such line: {line}"
-        rows[kind].append(rest)
-    changes, status = ", ".join(rows["->"]), int(rows["exit"][-1])
-    harness.check_boot(situation, changes, rows["!"], status, BINARIES[binary])
+@pytest.mark.parametrize("boot", read_boots(), ids=lambda boot: boot[0].removesuffix(": *"))
+def test_boot(boot, binary):
+    _, situation, changes, warnings, status = boot
+    check_boot(situation, changes, warnings, status, BINARIES[binary])

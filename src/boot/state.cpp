@@ -29,18 +29,10 @@ bool touch(const char* path) noexcept {
   return is_there && closed;
 }
 
-}  // namespace
-
-void prepare_state_directories() noexcept {
-  // The class is optional: the data can be used in any.
-  platform::set_protection_class(paths::state_directory, protection_class);
-  platform::set_protection_class(paths::dataset_root, protection_class);
-}
-
-std::string latest_dataset_path() { return fs::read_symlink(paths::latest_link); }
-
-std::string current_dataset_path() { return dataset_path_from_link(fs::read_symlink(paths::zoneinfo_link)); }
-
+/// Returns the path of the dataset that the zoneinfo link's `target` lies in: all before the last "/", if the target
+/// begins with the dataset root and the dataset has a name; the empty string for the system partition's zone files.
+///
+/// Throws the `int` -1, after a warning, for every other target.
 std::string dataset_path_from_link(const std::string& target) {
   constexpr std::string_view root = paths::dataset_root;
   if (target.starts_with(root)) {
@@ -55,6 +47,18 @@ std::string dataset_path_from_link(const std::string& target) {
   ::warn("Bad zoneinfo link %s", target.c_str());
   throw rejected_link;
 }
+
+}  // namespace
+
+void prepare_state_directories() noexcept {
+  // The class is optional: the data can be used in any.
+  platform::set_protection_class(paths::state_directory, protection_class);
+  platform::set_protection_class(paths::dataset_root, protection_class);
+}
+
+std::string latest_dataset_path() { return fs::read_symlink(paths::latest_link); }
+
+std::string current_dataset_path() { return dataset_path_from_link(fs::read_symlink(paths::zoneinfo_link)); }
 
 void mark_needs_cleanup() noexcept {
   if (!touch(paths::needs_cleanup)) {

@@ -15,15 +15,9 @@ std::string latest_dataset_path();
 
 /// Returns the path of the dataset that the live zoneinfo link points into, empty for the system partition.
 ///
-/// Throws what `fs::read_symlink` throws, and what `dataset_path_from_link` throws: it rejects a missing link.
+/// Throws what `fs::read_symlink` throws and, after a warning, the `int` -1 for a missing link and for one that leads
+/// neither into a dataset nor exactly to the system partition's zone files.
 std::string current_dataset_path();
-
-/// Returns the path of the dataset that the zoneinfo link's `target` lies in: all before the last "/" when the target
-/// begins with "/var/db/timezone/tz/" and at least one byte is between that and the last "/"; the empty string for
-/// the system partition's zone files.
-///
-/// Throws the `int` -1, after a warning, for every other target.
-std::string dataset_path_from_link(const std::string& target);
 
 /// Creates the marker by which the clean-up job knows that an installed dataset was given up. A marker that exists
 /// keeps its contents. A failure gives a warning only.

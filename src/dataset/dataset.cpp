@@ -30,12 +30,13 @@ vrel_dataset::vrel_dataset(const std::string& path) : dataset_path_(path) { crea
 void vrel_dataset::create_components() {
   const auto zoneinfo = std::make_shared<const vrel_zoneinfo>(dataset_path_);
   version_string_ = dataset_path_.empty() ? zoneinfo->zoneinfo_version() + ".1.0" : version_from_path(dataset_path_);
-  version::parse_version(data_version_, version_string_);
+  data_version_ = version::data_version(version_string_);
   components_.push_back(zoneinfo);
   components_.push_back(std::make_shared<const vrel_icu>(dataset_path_));
 }
 
 void vrel_dataset::reset_to_system() {
+  // Read anew, though a caller may have it: the fallback has not, where reading failed. So its warnings come again.
   const vrel_dataset system;
   activate_all(system);
 }

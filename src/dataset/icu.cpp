@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstring>
 #include <memory>
+#include <string_view>
 
 #include "fs/file_system.hpp"
 #include "paths.hpp"
@@ -21,6 +22,22 @@ using walk_handle = std::unique_ptr<FTS, walk_closer>;
 
 bool is_file_readable_by_others(const FTSENT& entry) {
   return entry.fts_errno == 0 && entry.fts_info == FTS_F && (entry.fts_statp->st_mode & S_IROTH) != 0;
+}
+
+/// Returns the schema in the name of an ICU data file: "icutz", the schema, ".dat", where the schema is decimal digits
+/// and one of the letters l, b and e. Empty for any other name.
+std::string_view schema_in_file_name(std::string_view name) noexcept {
+  constexpr std::string_view prefix = "icutz";
+  constexpr std::string_view suffix = ".dat";
+  if (!name.starts_with(prefix) || !name.ends_with(suffix)) {
+    return {};
+  }
+  name.remove_prefix(prefix.size());
+  name.remove_suffix(suffix.size());
+  const auto digits = name.find_first_not_of("0123456789");
+  const bool digits_and_byte_order = name.size() >= 2 && digits == name.size() - 1 &&
+                                     std::string_view("lbe").find(name.back()) != std::string_view::npos;
+  return digits_and_byte_order ? name : std::string_view();
 }
 
 }  // namespace
@@ -82,20 +99,6 @@ void vrel_icu::activate() const {
   if (!dataset_path_.empty()) {
     fs::create_symlink(data_directory_.c_str(), paths::icu_link);
   }
-}
-
-std::string_view schema_in_file_name(std::string_view name) noexcept {
-  constexpr std::string_view prefix = "icutz";
-  constexpr std::string_view suffix = ".dat";
-  if (!name.starts_with(prefix) || !name.ends_with(suffix)) {
-    return {};
-  }
-  name.remove_prefix(prefix.size());
-  name.remove_suffix(suffix.size());
-  const auto digits = name.find_first_not_of("0123456789");
-  const bool digits_and_byte_order = name.size() >= 2 && digits == name.size() - 1 &&
-                                     std::string_view("lbe").find(name.back()) != std::string_view::npos;
-  return digits_and_byte_order ? name : std::string_view();
 }
 
 }  // namespace dataset

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <string>
-#include <string_view>
 
 #include "dataset/component.hpp"
 
@@ -30,9 +29,5 @@ class vrel_icu final : public vrel_dataset_component {
   std::string schema_;
   std::string data_directory_;
 };
-
-/// Returns the schema in the name of an ICU data file: "icutz", the schema, ".dat", where the schema is decimal digits
-/// and one of the letters l, b and e. Empty for any other name.
-std::string_view schema_in_file_name(std::string_view name) noexcept;
 
 }  // namespace dataset

@@ -82,7 +82,7 @@ void create_symlink(const char* target, const char* link) {
 
 std::string first_word(const char* path) {
   constexpr std::string_view white_space = " \t\n\v\f\r";
-  constexpr std::size_t longest_word = 16U << 20U;
+  constexpr std::size_t most_bytes = 16U << 20U;
   std::string word;
   const file source(path, O_RDONLY);
   if (!source.is_usable()) {
@@ -90,7 +90,8 @@ std::string first_word(const char* path) {
   }
   char buffer[4096];
   ssize_t length = 0;
-  while (word.size() < longest_word && (length = ::read(source.descriptor(), buffer, sizeof buffer)) > 0) {
+  for (std::size_t count = 0; count < most_bytes && (length = ::read(source.descriptor(), buffer, sizeof buffer)) > 0;
+       count += static_cast<std::size_t>(length)) {
     std::string_view rest(buffer, static_cast<std::size_t>(length));
     if (word.empty()) {
       rest.remove_prefix(std::min(rest.find_first_not_of(white_space), rest.size()));
@@ -101,7 +102,7 @@ std::string first_word(const char* path) {
       break;
     }
   }
-  return word.substr(0, longest_word);
+  return word;
 }
 
 void write_file(const char* path, std::string_view text) noexcept {

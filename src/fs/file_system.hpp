@@ -32,9 +32,9 @@ std::string read_symlink(const char* path);
 /// Throws errno as `symlink` sets it: EEXIST when anything, even a dangling link, is at `link`; that stays as it was.
 void create_symlink(const char* target, const char* link);
 
-/// Returns the first word of a file: the bytes from the first that is not white space up to the next white space, at
-/// most 16 MiB. Empty, without a warning, when there is none, the file cannot be read or is not a regular one. Never
-/// waits for a FIFO or a device.
+/// Returns the first word in the first 16 MiB of a file: the bytes from the first that is not white space up to the
+/// next white space. Empty, without a warning, when there is none, the file cannot be read or is not a regular one.
+/// Never waits for a FIFO or a device.
 std::string first_word(const char* path);
 
 /// Replaces the content of a file, which is created with mode 0666 less the umask if it does not exist. What exists and
