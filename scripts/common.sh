@@ -64,3 +64,8 @@ make_update() {
   # ICU opens the one name; the other says which schema it has.
   cp "$1/icutz/zoneinfo64.res" "$1/icutz/icutz$2.dat"
 }
+
+# icu_version: the version of the zone data that ICU reads, its own if there is no live link.
+icu_version() {
+  ICU_TIMEZONE_FILES_DIR=/var/db/timezone/icutz icuinfo 2>/dev/null | sed -n 's/.*tz.version">\(.*\)<.*/\1/p'
+}
