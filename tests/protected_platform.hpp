@@ -8,6 +8,6 @@
 
 inline int open_dprotected_np(const char* path, int flags, int protection_class, int dpflags, mode_t mode) {
   const int descriptor = ::open(path, flags, mode);
-  ::fcntl(descriptor, F_SETPROTECTIONCLASS, protection_class + dpflags);
+  ::fcntl(descriptor, F_SETPROTECTIONCLASS, protection_class + 100 * dpflags);
   return descriptor;
 }

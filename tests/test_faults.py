@@ -1,4 +1,7 @@
-"""Lets each system call of a run fail, or kills the program before it, and boots again."""
+"""Lets each system call of a run fail, or kills the program before it, and boots again.
+
+Likewise the sample installer is killed before each call that changes the disk.
+"""
 
 import os
 import re
@@ -7,36 +10,39 @@ from pathlib import Path
 
 import pytest
 
-from test_boots import BINARIES, STATE, read_disk, run, stage
+from test_boots import BINARIES, STATE, create, read_disk, run, stage
 
 # Together they reach every call that a run can make.
 SITUATIONS = [
     "zoneinfo > @2021b.1.0/zoneinfo, /var/db/icutz > @2021b.1.0/icutz, dataset 2021b.1.0, "
     "latest 2022a.1.0, marker, /var/db/icu =, localtime > /usr/share/zoneinfo/Europe/Paris",
-    "system 2022a, live 2021b.1.0, tz_latest > /elsewhere, localtime =",
-    "zoneinfo > x, icutz > x, latest 2021b.1.0",
+    # The latest is older than the system: one boot switches to it, the next rejects it.
+    "system 2022z, live 2021b.1.0, latest 2022a.1.0, localtime =",
+    "zoneinfo > x, icutz > x, tz_latest > /elsewhere",
 ]
 OWN = [STATE + name for name in ("zoneinfo", "icutz", "localtime", "needs_cleanup")]
 OWN += [STATE + "TZVersionDiffRecord", "/var/db/icutz", "/var/db/icu"]
-NEVER_FAIL = ["brk", "exit_group", "futex"]  # None of them fails by an errno value.
+# None of the first fails by an errno value. What comes before the first call of main is the C library's.
+OF_THE_RUN = r"(?!brk|exit_group|futex)", "rt_sigaction(SIGPIPE"
+CHANGES_DISK = r"mkdir|rename|symlink|link|unlink|copy_file|write|f?chmod|sync|.*O_CREAT", "execve("
+TRACE = Path("build/trace").absolute()
+
+
+def calls(trace, wanted):
+    """Yields each wanted system call of a trace, and how to let strace inject a fault into it."""
+    counts, started = Counter(), False
+    for line in re.findall(r"^\w+\(.* = .*", trace, re.MULTILINE):
+        name = line.partition("(")[0]
+        counts[name] += 1
+        if started and re.match(wanted[0], line):
+            yield line, f"-einject={name}:when={counts[name]}:"
+        started = started or line.startswith(wanted[1])
 
 
 def traced_run(*options):
     """Returns the exit status and the trace of a run."""
-    status, _ = run(["strace", "-o", "build/trace", *options, *BINARIES["release"]])
-    return status, Path("build/trace").read_text()
-
-
-def calls_of_a_run():
-    """Yields each system call of the program itself, and how to let strace inject a fault into it."""
-    counts, started = Counter(), False
-    for line in re.findall(r"^\w+\(.* = .*", traced_run()[1], re.MULTILINE):
-        name = line.partition("(")[0]
-        counts[name] += 1
-        if started and name not in NEVER_FAIL:
-            yield line, f"-einject={name}:when={counts[name]}:"
-        # The C library's start comes first; the first call of main makes the process ignore SIGPIPE.
-        started = started or line.startswith("rt_sigaction(SIGPIPE")
+    status, _ = run(["strace", f"-o{TRACE}", *options, *BINARIES["release"]])
+    return status, TRACE.read_text()
 
 
 def others(disk):
@@ -45,9 +51,9 @@ def others(disk):
 
 
 def check_recovery(before):
-    """Asserts that two more boots settle the links."""
-    run()
-    run()
+    """Asserts that three more boots settle the links."""
+    for _ in range(3):
+        run()
     after = read_disk()
     zoneinfo, localtime = (os.readlink(STATE + name) for name in ("zoneinfo", "localtime"))
     assert os.path.isfile(zoneinfo + "/Europe/Paris")
@@ -67,7 +73,7 @@ def test_fault(situation, fault):
     stage(situation)
     before = read_disk()
     problems = []
-    for call, injection in list(calls_of_a_run()):
+    for call, injection in calls(traced_run()[1], OF_THE_RUN):
         stage(situation)
         status, trace = traced_run(injection + fault)
         try:
@@ -78,3 +84,43 @@ def test_fault(situation, fault):
         except (AssertionError, OSError) as problem:
             problems.append(f"{fault} at {call}\n{problem}")
     assert not problems, "\n" + "\n\n".join(problems)
+
+
+# The commands by which the installer changes the disk, with the end of the arguments.
+COMMANDS = ["rm new", "ln new", "mkdir partial", "cp partial", "chmod partial", "sync partial"]
+COMMANDS += ["mv 2022a.1.0", "mv tz_latest", "sync timezone"]
+# Takes the place of such a command, which is traced, and takes the installer with it if it is killed.
+TRACED = """#!/bin/sh
+if [ "${*%$CUT}" != "$*" ] && [ ! -e "$TRACE" ]
+then strace -o "$TRACE" $INJECT /bin/${0##*/} "$@" || kill -9 $PPID
+else exec /bin/${0##*/} "$@"
+fi"""
+
+
+def install(cut="never", injection=""):
+    """Installs an update with the sample program. Returns its exit status."""
+    TRACE.unlink(missing_ok=True)
+    variables = [f"PATH={TRACE}ed:/bin", f"TRACE={TRACE}", f"INJECT={injection}", f"CUT={cut}"]
+    return run(["env", *variables, "examples/install-dataset", "/var/new/2022a.1.0"])[0]
+
+
+@pytest.mark.parametrize("command", COMMANDS)
+def test_installation_that_is_cut_short(command):
+    situation = "live 2021b.1.0, latest 2021b.1.0, tz/.partial/x =, dataset ../../../new/2022a.1.0"
+    name, cut = command.split(" ")
+    create(Path(f"{TRACE}ed", name), "=", TRACED)
+    os.chmod(f"{TRACE}ed/{name}", 0o755)
+    stage(situation)
+    assert install(cut) == 0 and run() == (0, [])
+    run()
+    installed = read_disk()
+    cuts = list(calls(TRACE.read_text(), CHANGES_DISK))
+    for call, injection in cuts:
+        stage(situation)
+        assert install(cut, injection + "signal=KILL") == -9, call
+        assert run()[0] == 0 and os.path.isfile(f"{STATE}zoneinfo/Europe/Paris"), call
+        assert install() == 0
+        run()
+        run()
+        assert read_disk() == installed, call
+    assert cuts
