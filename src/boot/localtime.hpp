@@ -2,13 +2,11 @@
 
 namespace boot {
 
-/// Makes "/var/db/timezone/localtime" point through the live zoneinfo link at a zone file. A target that begins with
-/// "/var/db/timezone/zoneinfo" is left alone, whether or not it exists. In one that begins with "/usr/share/zoneinfo"
-/// this is replaced by "/var/db/timezone/zoneinfo", if the result exists. Anything else is replaced by
-/// America/Los_Angeles. A change gives warnings.
+/// Keeps a local time link that leads through the live zoneinfo link, rewrites one of the legacy form if the zone
+/// exists, and replaces anything else by America/Los_Angeles.
 ///
-/// Throws errno, after a warning, when the link to America/Los_Angeles cannot be created. The old link is then gone. A
-/// directory with something in it stays (EEXIST).
+/// Throws errno, after a warning, when the link cannot be created; what was there is gone, unless it is a directory
+/// with something in it (EEXIST).
 void repair_localtime_link();
 
 }  // namespace boot

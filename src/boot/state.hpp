@@ -4,23 +4,19 @@
 
 namespace boot {
 
-/// Puts the state directory and the dataset root into their data-protection class, where the platform has them.
-/// A directory that is missing or cannot be opened gives no warning; none is created.
+/// Gives the state directory and the dataset root their data-protection class, where the platform has them. Creates
+/// neither. Failures give no warning.
 void prepare_state_directories() noexcept;
 
-/// Returns what "tz_latest" holds, unexamined: the path of the newest installed dataset. Empty when there is no link.
-///
-/// Throws what `fs::read_symlink` throws.
+/// Returns what "tz_latest" holds, unexamined; empty when there is no link. Throws what `fs::read_symlink` throws.
 std::string latest_dataset_path();
 
-/// Returns the path of the dataset that the live zoneinfo link points into, empty for the system partition.
+/// Returns the path of the dataset that the live zoneinfo link leads into, empty for the system partition.
 ///
-/// Throws what `fs::read_symlink` throws and, after a warning, the `int` -1 for a missing link and for one that leads
-/// neither into a dataset nor exactly to the system partition's zone files.
+/// Throws what `fs::read_symlink` throws and, after a warning, the `int` -1 for a missing link or any other target.
 std::string current_dataset_path();
 
-/// Creates the marker by which the clean-up job knows that an installed dataset was given up. A marker that exists
-/// keeps its contents. A failure gives a warning only.
+/// Creates the marker for the clean-up job, or leaves it as it is. A failure gives a warning only.
 void mark_needs_cleanup() noexcept;
 
 }  // namespace boot

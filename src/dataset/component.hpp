@@ -4,23 +4,19 @@
 
 namespace dataset {
 
-/// One kind of data in a dataset: its directory, what has to be known of it, and the live link that leads to it.
-/// A component reads its directory when it is built and never changes afterwards.
-///
-/// The destructor is neither virtual nor public: a component is created by `std::make_shared` of its concrete class,
-/// whose handle destroys that class, and is never deleted through this interface.
+/// One kind of data in a dataset. It is read when the component is built. `std::make_shared` of the concrete class
+/// creates it, so that the handle destroys that class: the destructor here is not virtual.
 class vrel_dataset_component {
  public:
   vrel_dataset_component(const vrel_dataset_component&) = delete;
   vrel_dataset_component& operator=(const vrel_dataset_component&) = delete;
 
-  /// Returns whether this data and that of `other`, a component of another dataset, can stand in for each other.
+  /// Returns whether this data and that of another dataset can stand in for each other.
   virtual bool compatible_schema(const vrel_dataset_component* other) const = 0;
 
-  /// Repoints the live link of this kind of data at this component's directory: removes the link and creates it anew.
-  /// A link that cannot be removed gives warnings only.
+  /// Removes the live link of this kind of data, a failure giving warnings only, and creates it anew.
   ///
-  /// Throws errno when the link cannot be created; what was removed stays removed.
+  /// Throws errno, after a warning, when it cannot be created; it is missing then.
   virtual void activate() const = 0;
 
  protected:
@@ -30,10 +26,9 @@ class vrel_dataset_component {
   const std::string dataset_path_;  // empty: the system partition
 };
 
-/// The compiled zone files of a dataset. They have no schema: any fits any other.
+/// The compiled zone files of the dataset at a path, of the system partition if that is empty. Any fit any others.
 class vrel_zoneinfo final : public vrel_dataset_component {
  public:
-  /// The zone files of the dataset at `path`; those of the system partition when `path` is empty.
   explicit vrel_zoneinfo(const std::string& path = {});
 
   bool compatible_schema(const vrel_dataset_component* other) const override;

@@ -6,17 +6,15 @@
 
 namespace dataset {
 
-/// The ICU time-zone data of a dataset. It has a schema, such as 44l, and fits only data of the same schema.
+/// The ICU data of the dataset at a path, of the system partition if that is empty. It has a schema, such as 44l, and
+/// fits only data of the same schema, an empty one included.
 class vrel_icu final : public vrel_dataset_component {
  public:
-  /// The ICU data of the dataset at `path`; that of the system partition when `path` is empty. Installed data has
-  /// the schema that the name of a regular file directly in its directory has, if others can read that file. Without
-  /// such a file there is a warning, and the schema is empty.
-  ///
-  /// Throws errno, after a warning, when the data's directory cannot be walked at all (ENOMEM).
+  /// Installed data without a schema gives a warning. Throws errno, after a warning, when memory for reading the
+  /// directory runs out (ENOMEM).
   explicit vrel_icu(const std::string& path = {});
 
-  /// Returns whether `other` is ICU data of the same schema, an empty one included. Warns when it is no ICU data.
+  /// Warns when `other` is no ICU data.
   bool compatible_schema(const vrel_dataset_component* other) const override;
 
   /// Also removes the legacy link, unless the live link cannot be removed. For the system's data no link is created.
