@@ -48,8 +48,8 @@ bool newer_than(const vrel_dataset& a, const vrel_dataset& b) noexcept {
 }
 
 bool all_compatible(const vrel_dataset& a, const vrel_dataset& b) {
-  return std::equal(a.components_.begin(), a.components_.end(), b.components_.begin(), b.components_.end(),
-                    [](const auto& own, const auto& other) { return own->compatible_schema(other.get()); });
+  return std::ranges::equal(a.components_, b.components_,
+                            [](const auto& own, const auto& other) { return own->compatible_schema(other.get()); });
 }
 
 void activate_all(const vrel_dataset& d) {
