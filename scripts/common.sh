@@ -47,7 +47,6 @@ sysctl user.max_user_namespaces=10000 and, where it exists, kernel.apparmor_rest
 # stage_system VERSION SOURCE: puts zone files of the zone source into the system partition below $root.
 stage_system() {
   local share=${root-}/usr/share
-  rm -rf "$share/zoneinfo.default"
   mkdir -p "$share/zoneinfo.default" "$share/icu"
   zic -d "$share/zoneinfo.default" "$2"
   echo "$1" >"$share/zoneinfo.default/+VERSION"
@@ -63,9 +62,4 @@ make_update() {
   genrb --quiet --destdir "$1/icutz" "$1/zoneinfo64.txt"
   # ICU opens the one name; the other says which schema it has.
   cp "$1/icutz/zoneinfo64.res" "$1/icutz/icutz$2.dat"
-}
-
-# icu_version: the version of the zone data that ICU reads, its own if there is no live link.
-icu_version() {
-  ICU_TIMEZONE_FILES_DIR=/var/db/timezone/icutz icuinfo 2>/dev/null | sed -n 's/.*tz.version">\(.*\)<.*/\1/p'
 }

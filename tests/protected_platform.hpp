@@ -1,5 +1,3 @@
-#pragma once
-
 // What a platform with data-protection classes declares, to build the program as it is built there. A trace shows the
 // class of each file.
 #include <fcntl.h>

@@ -16,7 +16,7 @@ void migrate_legacy_icu_link() noexcept {
       ::warn("Could not migrate %s to %s", paths::legacy_icu_link, paths::icu_link);
     }
   }
-  // Tested anew, so that one test that fails by accident does not keep the link.
+  // Whatever became of the copy.
   if (fs::path_exists(paths::legacy_icu_link)) {
     try {
       fs::remove(paths::legacy_icu_link);

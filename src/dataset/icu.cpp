@@ -66,13 +66,7 @@ void vrel_icu::read_schema_from_file_names() {
   }
   FTSENT* entry = nullptr;
   while (schema_.empty() && (entry = ::fts_read(walk.get())) != nullptr) {
-    if (entry->fts_level != 1) {
-      continue;
-    }
-    if (entry->fts_info == FTS_D) {
-      // Nothing further down can match, and a large tree there must not delay a boot.
-      ::fts_set(walk.get(), entry, FTS_SKIP);
-    } else if (is_file_readable_by_others(*entry)) {
+    if (entry->fts_level == 1 && is_file_readable_by_others(*entry)) {
       schema_ = schema_in_file_name({entry->fts_name, entry->fts_namelen});
     }
   }

@@ -18,7 +18,7 @@ class file {
  public:
   /// Opens the file without waiting for the other end of a FIFO or for a device.
   file(const char* path, int flags, mode_t mode = 0) noexcept
-      : descriptor_(::open(path, flags | O_CLOEXEC | O_NOCTTY | O_NONBLOCK, mode)) {}
+      : descriptor_(::open(path, flags | O_CLOEXEC | O_NONBLOCK, mode)) {}
   ~file() {
     if (descriptor_ >= 0) {
       ::close(descriptor_);

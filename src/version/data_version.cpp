@@ -44,7 +44,7 @@ std::string_view take_dotted_number(std::string_view& text) {
 }
 
 // One pass suffices: no group can begin with a byte that the group before it takes. std::regex would dominate the run
-// time, and libstdc++'s matcher recurses once per byte, so that a long +VERSION overflows the stack.
+// time, and overflow the stack at a long text.
 std::optional<version_groups> match(std::string_view text) {
   version_groups groups;
   groups.year = take_run(text, digits);
