@@ -116,10 +116,8 @@ def read_boots():
             status = int("".join(rows["exit"]) or 0)
             name += f": {case}" if rows["|"] else ""
             script = "".join(rows["run"]).replace("*", case)
-            commands = (
-                {"script": ["bash", "-c", script, *BINARIES["release"]]} if script else BINARIES
-            )
-            for label, command in commands.items():
+            by_script = {"script": ["bash", "-c", script, *BINARIES["release"]]}
+            for label, command in (by_script if script else BINARIES).items():
                 boot = situation.strip(), changes, warnings, status, command
                 yield pytest.param(*boot, id=f"{name}-{label}")
 
