@@ -44,13 +44,13 @@ sysctl user.max_user_namespaces=10000 and, where it exists, kernel.apparmor_rest
     exec "$@"' sandbox "$@"
 }
 
-# stage_system VERSION SOURCE: puts zone files of the zone source into the system partition below $root.
+# stage_system SHARE VERSION SOURCE: puts zone files of the zone source into the system partition, whose /usr/share is
+# SHARE.
 stage_system() {
-  local share=${root-}/usr/share
-  mkdir -p "$share/zoneinfo.default" "$share/icu"
-  zic -d "$share/zoneinfo.default" "$2"
-  echo "$1" >"$share/zoneinfo.default/+VERSION"
-  echo 44l >"$share/icu/icutzformat.txt"
+  mkdir -p "$1/icu"
+  zic -d "$1/zoneinfo.default" "$3"
+  echo "$2" >"$1/zoneinfo.default/+VERSION"
+  echo 44l >"$1/icu/icutzformat.txt"
 }
 
 # make_update DIRECTORY SCHEMA: makes the dataset that an update brings. Paris is two hours east of UTC in it, the whole

@@ -22,21 +22,25 @@ SITUATIONS = [
 ]
 OWN = [STATE + name for name in ("zoneinfo", "icutz", "localtime", "needs_cleanup")]
 OWN += [STATE + "TZVersionDiffRecord", "/var/db/icutz", "/var/db/icu"]
-# Calls that get a fault: from the first of main on those whose failure the program can see; those that change the disk.
+# Calls that get a fault, and the call after which they begin. Of a run: all whose failure the program can see. Of a
+# command: those that change the disk.
 OF_THE_RUN = r"(?!brk|exit_group)", "rt_sigaction(SIGPIPE"
 CHANGES_DISK = r"mkdir|rename|symlink|link|unlink|copy_file|write|f?chmod|sync|.*O_CREAT", "execve("
 TRACE = Path("build/trace").absolute()
+TOOLS = TRACE.with_name("tools")
 
 
 def calls(trace, wanted):
-    """Yields each wanted system call of a trace, and how to let strace inject a fault into it."""
-    counts, started = Counter(), False
+    """Returns the wanted system calls of a trace, and how to let strace inject a fault into each."""
+    counts, started, found = Counter(), False, []
     for line in re.findall(r"^\w+\(.* = .*", trace, re.MULTILINE):
         name = line.partition("(")[0]
         counts[name] += 1
         if started and re.match(wanted[0], line):
-            yield line, f"-einject={name}:when={counts[name]}:"
+            found.append((line, f"-einject={name}:when={counts[name]}:"))
         started = started or line.startswith(wanted[1])
+    assert found
+    return found
 
 
 def traced_run(*options):
@@ -96,7 +100,7 @@ fi"""
 def install(cut="never", injection=""):
     """Installs an update with the sample program. Returns its exit status."""
     TRACE.unlink(missing_ok=True)
-    variables = [f"PATH={TRACE}ed:/bin", f"TRACE={TRACE}", f"INJECT={injection}", f"CUT={cut}"]
+    variables = [f"PATH={TOOLS}:/bin", f"TRACE={TRACE}", f"INJECT={injection}", f"CUT={cut}"]
     return run(["env", *variables, "examples/install-dataset", "/var/new/2022a.1.0"])[0]
 
 
@@ -104,22 +108,20 @@ def install(cut="never", injection=""):
 def test_installation_that_is_cut_short(command):
     situation = "live 2021b.1.0, latest 2021b.1.0, tz/.partial/x =, dataset ../../../new/2022a.1.0"
     name, cut = command.split(" ")
-    create(Path(f"{TRACE}ed"), "/")
-    create(Path(f"{TRACE}ed", name), "=", TRACED)
-    create(Path(f"{TRACE}ed", name), "mode", "755")
+    create(TOOLS, "/")
+    create(TOOLS / name, "=", TRACED)
+    create(TOOLS / name, "mode", "755")
     stage(situation)
     assert install(cut) == 0 and run() == (0, [])
     run()
     installed = read_disk()
-    cuts = list(calls(TRACE.read_text(), CHANGES_DISK))
-    assert cuts
-    for call, injection in cuts:
+    for call, injection in calls(TRACE.read_text(), CHANGES_DISK):
         print("killed at", call)
         stage(situation)
         assert install(cut, injection + "signal=KILL") == -9
         assert run()[0] == 0
-        for whole in ("zoneinfo", "tz_latest/zoneinfo"):
-            assert os.path.isfile(f"{STATE}{whole}/Europe/Paris")
+        whole = [f"{STATE}{link}/Europe/Paris" for link in ("zoneinfo", "tz_latest/zoneinfo")]
+        assert all(map(os.path.isfile, whole))
         assert install() == 0
         run()
         run()

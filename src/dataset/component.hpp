@@ -16,7 +16,8 @@ class vrel_dataset_component {
 
   /// Removes the live link of this kind of data, a failure giving warnings only, and creates it anew.
   ///
-  /// Throws errno, after a warning, when it cannot be created; it is missing then.
+  /// Throws errno, after a warning, when it cannot be created: EEXIST when the old one is still there; otherwise it is
+  /// missing.
   virtual void activate() const = 0;
 
  protected:

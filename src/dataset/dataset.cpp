@@ -36,7 +36,7 @@ void vrel_dataset::create_components() {
 }
 
 void vrel_dataset::reset_to_system() {
-  // Read anew, though a caller may have it: the fallback has not, where reading failed. So its warnings come again.
+  // Read anew: the fallback has no such dataset if reading it has just failed. Its warnings then come twice.
   const vrel_dataset system;
   activate_all(system);
 }

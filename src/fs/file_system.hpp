@@ -3,8 +3,8 @@
 #include <string>
 #include <string_view>
 
-/// File-system operations. `warn_and_raise` reports and raises each failure that one does not tolerate; nothing has
-/// changed on disk then.
+/// File-system operations. A failure goes through `warn_and_raise`, unless the comment of the operation says otherwise;
+/// nothing has changed on disk then.
 namespace fs {
 
 /// Warns with the message and the text of errno, then throws the errno value as an `int`.
