@@ -22,8 +22,8 @@ SITUATIONS = [
 ]
 OWN = [STATE + name for name in ("zoneinfo", "icutz", "localtime", "needs_cleanup")]
 OWN += [STATE + "TZVersionDiffRecord", "/var/db/icutz", "/var/db/icu"]
-# Calls that get a fault, and the call after which they begin. Of a run: all whose failure the program can see. Of a
-# command: those that change the disk.
+# Calls that get a fault, and the call after which they begin. Of a run: all whose failure the
+# program can see. Of a command: those that change the disk.
 OF_THE_RUN = r"(?!brk|exit_group)", "rt_sigaction(SIGPIPE"
 CHANGES_DISK = r"mkdir|rename|symlink|link|unlink|copy_file|write|f?chmod|sync|.*O_CREAT", "execve("
 TRACE = Path("build/trace").absolute()
@@ -31,7 +31,7 @@ TOOLS = TRACE.with_name("tools")
 
 
 def calls(trace, wanted):
-    """Returns the wanted system calls of a trace, and how to let strace inject a fault into each."""
+    """Returns the wanted system calls of a trace, each with the option that injects a fault."""
     counts, started, found = Counter(), False, []
     for line in re.findall(r"^\w+\(.* = .*", trace, re.MULTILINE):
         name = line.partition("(")[0]
@@ -89,7 +89,7 @@ def test_fault(situation, fault):
 # The commands by which the installer changes the disk, with the end of the arguments.
 COMMANDS = ["rm new", "ln new", "mkdir partial", "cp partial", "chmod partial", "sync partial"]
 COMMANDS += ["mv 2022a.1.0", "mv tz_latest", "sync timezone"]
-# Takes the place of such a command, which is traced, and takes the installer with it if it is killed.
+# Takes the place of such a command, which is traced, and takes the installer with it if killed.
 TRACED = """#!/bin/sh
 if [ "${*%$CUT}" != "$*" ] && [ ! -e "$TRACE" ]
 then strace -o "$TRACE" $INJECT /bin/${0##*/} "$@" || kill -9 $PPID
