@@ -11,11 +11,12 @@ die() {
 
 # need PACKAGE...: installs the Debian packages, unless all are there.
 need() {
-  local as_root=()
+  local as_root=() log
   (($(dpkg-query -W -f '${db:Status-Status}\n' "$@" 2>/dev/null | grep -cx installed) < $#)) || return 0
   ((EUID == 0)) || as_root=(sudo)
   "${as_root[@]}" apt-get update -qq
-  "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get install -y -qq --no-install-recommends "$@" >/dev/null
+  log=$("${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get install -y -qq --no-install-recommends "$@" 2>&1) ||
+    die "$log"
 }
 
 # build PRESET [DIRECTORY [OPTION...]]: builds in build/DIRECTORY, or in the preset's own, with these options of cmake.

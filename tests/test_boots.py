@@ -3,6 +3,7 @@
 boots.txt explains the notation.
 """
 
+import difflib
 import os
 import re
 import shutil
@@ -41,6 +42,7 @@ os.umask(0o022)
 
 def in_full(statement):
     """Returns the statements on paths that a statement stands for."""
+    assert "," not in statement, f"a comma without a blank behind it: {statement}"
     name, *words = statement.split(" ")
     full = SHORT.get(statement) or SHORT.get(name)
     return full.format(*words, "44l").split(", ") if full else [statement]
@@ -91,6 +93,13 @@ def read_disk():
     return disk
 
 
+def as_lines(status, warnings):
+    """Returns what a boot leaves behind: a line for each thing, in the notation of boots.txt."""
+    disk = [f"{path} {value}" for path, value in sorted(read_disk().items())]
+    lines = [f"exit {status}", *(f"! {text}" for text in warnings), *disk]
+    return [line.encode("unicode_escape").decode() for line in lines]
+
+
 def run(command=BINARIES["release"]):
     """Runs the program, or a command that ends in it. Returns exit status and lines of output."""
     result = subprocess.run(command, capture_output=True, encoding="latin-1", timeout=10)
@@ -125,15 +134,16 @@ def read_boots():
 @pytest.mark.parametrize("situation, changes, warnings, status, command", read_boots())
 def test_boot(situation, changes, warnings, status, command):
     stage(f"{situation}, {changes}")
-    expected = {"exit status": status, "warnings": warnings} | read_disk()
+    expected = as_lines(status, warnings)
     stage(situation)
     os.utime(STATE, (0, 0))
     status, texts = run(command)
     texts = [cut if (cut := text.rpartition(": ")[0]) in warnings else text for text in texts]
     if texts and warnings == ["tzreconcile: any"]:
         texts = warnings
-    seen = {"exit status": status, "warnings": texts}
-    assert seen | read_disk() == expected
+    differs = [line for line in difflib.ndiff(expected, as_lines(status, texts)) if line[0] in "-+"]
+    if differs:
+        pytest.fail("\n".join(differs), pytrace=False)
     if not changes and not texts:
         assert os.stat(STATE).st_mtime == 0, "a quiet boot has written to the state directory"
 

@@ -83,4 +83,6 @@ void parse_version(data_version& version, const std::string& text) {
 
 bool newer_than(const data_version& a, const data_version& b) noexcept { return in_order(a) > in_order(b); }
 
+bool same_version(const data_version& a, const data_version& b) noexcept { return in_order(a) == in_order(b); }
+
 }  // namespace version

@@ -29,4 +29,7 @@ void parse_version(data_version& version, const std::string& text);
 /// major and minor number. A number that is not given is older than any that is.
 bool newer_than(const data_version& a, const data_version& b) noexcept;
 
+/// Returns whether all four fields are equal, which is when neither version is newer.
+bool same_version(const data_version& a, const data_version& b) noexcept;
+
 }  // namespace version
