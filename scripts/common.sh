@@ -26,12 +26,12 @@ build() {
   cmake --build "build/${2:-$1}" -- --quiet
 }
 
-# in_sandbox: whether /var and /usr/share are those of a sandbox.
+# in_sandbox: whether this is a sandbox.
 in_sandbox() { grep -q '^tzreconcile-sandbox /var ' /proc/self/mounts; }
 
 # sandbox COMMAND...: runs the command at the top of the tree in a private mount namespace, with empty file systems on
-# /var and /usr/share, so that the machine's own paths stay as they are. As an ordinary user it does so in a user
-# namespace. The tree is mounted at /mnt first, since it may be below a path that is covered next.
+# /var, /usr/share and /run, and a copy of /etc, so that the machine's own paths stay as they are. As an ordinary user
+# it does so in a user namespace. The tree is mounted at /mnt first, since it may be below a path that is covered next.
 sandbox() {
   local private=(unshare --mount)
   ((EUID == 0)) || private+=(--map-root-user)
@@ -42,6 +42,10 @@ sysctl user.max_user_namespaces=10000 and, where it exists, kernel.apparmor_rest
     cd /mnt
     mount -t tmpfs tzreconcile-sandbox /var
     mount -t tmpfs tzreconcile-sandbox /usr/share
+    mount -t tmpfs tzreconcile-sandbox /run
+    cp -a /etc /run 2>/dev/null || true # but for what only root can read
+    mount --bind /run/etc /etc
+    ln -sfn /var/db/timezone/localtime /etc/localtime
     exec "$@"' sandbox "$@"
 }
 

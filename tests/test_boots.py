@@ -94,10 +94,16 @@ def read_disk():
 
 
 def as_lines(status, warnings):
-    """Returns what a boot leaves behind: a line for each thing, in the notation of boots.txt."""
+    """Returns what a run leaves behind: a line for each thing, in the notation of boots.txt."""
     disk = [f"{path} {value}" for path, value in sorted(read_disk().items())]
     lines = [f"exit {status}", *(f"! {text}" for text in warnings), *disk]
     return [line.encode("unicode_escape").decode() for line in lines]
+
+
+def compare(expected, seen):
+    differs = [line for line in difflib.ndiff(expected, seen) if line[0] in "-+"]
+    if differs:
+        pytest.fail("\n".join(differs), pytrace=False)
 
 
 def run(command=BINARIES["release"]):
@@ -141,9 +147,7 @@ def test_boot(situation, changes, warnings, status, command):
     texts = [cut if (cut := text.rpartition(": ")[0]) in warnings else text for text in texts]
     if texts and warnings == ["tzreconcile: any"]:
         texts = warnings
-    differs = [line for line in difflib.ndiff(expected, as_lines(status, texts)) if line[0] in "-+"]
-    if differs:
-        pytest.fail("\n".join(differs), pytrace=False)
+    compare(expected, as_lines(status, texts))
     if not changes and not texts:
         assert os.stat(STATE).st_mtime == 0, "a quiet boot has written to the state directory"
 

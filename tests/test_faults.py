@@ -1,7 +1,4 @@
-"""Lets each system call of a run fail, or kills the program before it, and boots again.
-
-Likewise the sample installer is killed before each call that changes the disk.
-"""
+"""Lets each system call of a run fail, or kills the program before it, and boots again."""
 
 import os
 import re
@@ -22,12 +19,9 @@ SITUATIONS = [
 ]
 OWN = [STATE + name for name in ("zoneinfo", "icutz", "localtime", "needs_cleanup")]
 OWN += [STATE + "TZVersionDiffRecord", "/var/db/icutz", "/var/db/icu"]
-# Calls that get a fault, and the call after which they begin. Of a run: all whose failure the
-# program can see. Of a command: those that change the disk.
+# All calls whose failure the program can see, and the call after which they begin.
 OF_THE_RUN = r"(?!brk|exit_group)", "rt_sigaction(SIGPIPE"
-CHANGES_DISK = r"mkdir|rename|symlink|link|unlink|copy_file|write|f?chmod|sync|.*O_CREAT", "execve("
 TRACE = Path("build/trace").absolute()
-TOOLS = TRACE.with_name("tools")
 
 
 def calls(trace, wanted):
@@ -84,45 +78,3 @@ def test_fault(situation, fault):
         assert status != 0 or all(os.path.islink(path) for path in (OWN[0], OWN[2]))
         assert others(read_disk()) == others(before)
         check_recovery(before)
-
-
-# The commands by which the installer changes the disk, with the end of the arguments.
-COMMANDS = ["rm new", "ln new", "mkdir partial", "cp partial", "chmod partial", "sync partial"]
-COMMANDS += ["mv 2022a.1.0", "mv tz_latest", "sync timezone"]
-# Takes the place of such a command, which is traced, and takes the installer with it if killed.
-TRACED = """#!/bin/sh
-if [ "${*%$CUT}" != "$*" ] && [ ! -e "$TRACE" ]
-then strace -o "$TRACE" $INJECT /bin/${0##*/} "$@" || kill -9 $PPID
-else exec /bin/${0##*/} "$@"
-fi"""
-
-
-def install(cut="never", injection=""):
-    """Installs an update with the sample program. Returns its exit status."""
-    TRACE.unlink(missing_ok=True)
-    variables = [f"PATH={TOOLS}:/bin", f"TRACE={TRACE}", f"INJECT={injection}", f"CUT={cut}"]
-    return run(["env", *variables, "examples/install-dataset", "/var/new/2022a.1.0"])[0]
-
-
-@pytest.mark.parametrize("command", COMMANDS)
-def test_installation_that_is_cut_short(command):
-    situation = "live 2021b.1.0, latest 2021b.1.0, tz/.partial/x =, dataset ../../../new/2022a.1.0"
-    name, cut = command.split(" ")
-    create(TOOLS, "/")
-    create(TOOLS / name, "=", TRACED)
-    create(TOOLS / name, "mode", "755")
-    stage(situation)
-    assert install(cut) == 0 and run() == (0, [])
-    run()
-    installed = read_disk()
-    for call, injection in calls(TRACE.read_text(), CHANGES_DISK):
-        print("killed at", call)
-        stage(situation)
-        assert install(cut, injection + "signal=KILL") == -9
-        assert run()[0] == 0
-        whole = [f"{STATE}{link}/Europe/Paris" for link in ("zoneinfo", "tz_latest/zoneinfo")]
-        assert all(map(os.path.isfile, whole))
-        assert install() == 0
-        run()
-        run()
-        assert read_disk() == installed
