@@ -93,15 +93,13 @@ def read_disk():
     return disk
 
 
-def as_lines(status, warnings):
-    """Returns what a run leaves behind: a line for each thing, in the notation of boots.txt."""
-    disk = [f"{path} {value}" for path, value in sorted(read_disk().items())]
-    lines = [f"exit {status}", *(f"! {text}" for text in warnings), *disk]
-    return [line.encode("unicode_escape").decode() for line in lines]
-
-
 def compare(expected, seen):
-    differs = [line for line in difflib.ndiff(expected, seen) if line[0] in "-+"]
+    """Fails with the lines that differ. What is compared has one value or a list for each name."""
+    lines = [[], []]
+    for side, values in zip(lines, (expected, seen)):
+        for name, value in sorted(values.items()):
+            side += [f"{name} {v}" for v in (value if isinstance(value, list) else [value])]
+    differs = [ascii(line)[1:-1] for line in difflib.ndiff(*lines) if line[0] in "-+"]
     if differs:
         pytest.fail("\n".join(differs), pytrace=False)
 
@@ -140,14 +138,14 @@ def read_boots():
 @pytest.mark.parametrize("situation, changes, warnings, status, command", read_boots())
 def test_boot(situation, changes, warnings, status, command):
     stage(f"{situation}, {changes}")
-    expected = as_lines(status, warnings)
+    expected = {"exit": status, "!": warnings} | read_disk()
     stage(situation)
     os.utime(STATE, (0, 0))
     status, texts = run(command)
     texts = [cut if (cut := text.rpartition(": ")[0]) in warnings else text for text in texts]
     if texts and warnings == ["tzreconcile: any"]:
         texts = warnings
-    compare(expected, as_lines(status, texts))
+    compare(expected, {"exit": status, "!": texts} | read_disk())
     if not changes and not texts:
         assert os.stat(STATE).st_mtime == 0, "a quiet boot has written to the state directory"
 
