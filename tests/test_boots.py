@@ -90,6 +90,8 @@ def read_disk():
             disk[str(path)] = f"= {path.read_text('latin-1')}"
         else:
             disk[str(path)] = "/" if path.is_dir() else "fifo"
+        if (mode := path.lstat().st_mode & 0o7777) not in (0o644, 0o755, 0o777):
+            disk[str(path)] += f" mode {mode:o}"
     return disk
 
 
@@ -120,8 +122,8 @@ def read_boots():
         for line in lines:
             kind, _, rest = line.partition(" ")
             assert kind in rows, f"no such line: {line}"
-            rows[kind].append(rest)
-        for case in " | ".join(rows["|"] or ["*"]).split(" | "):
+            rows[kind] += rest.split(f" {kind} ")
+        for case in rows["|"] or ["*"]:
             name, colon, situation = first.partition(":")
             assert colon, f"no colon after the name: {first}"
             situation, _, changes = situation.replace("*", case).partition("-> ")
