@@ -65,6 +65,6 @@ make_update() {
   printf 'Zone Europe/Paris 2 - CEST\nZone America/Los_Angeles -8 - PST\n' | zic -d "$1/zoneinfo" -
   derb -c -s - zoneinfo64.res | sed "/TZVersion/s/\"[^\"]*\"/\"$(basename "$1" .1.0)\"/" >"$1/zoneinfo64.txt"
   genrb --quiet --destdir "$1/icutz" "$1/zoneinfo64.txt"
-  # ICU opens the one name; the other says which schema it has.
+  # ICU opens zoneinfo64.res; tzreconcile reads the schema from the other name.
   cp "$1/icutz/zoneinfo64.res" "$1/icutz/icutz$2.dat"
 }

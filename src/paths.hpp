@@ -22,9 +22,9 @@ inline constexpr char latest_link[] = "/var/db/timezone/tz_latest";        // ne
 inline constexpr char needs_cleanup[] = "/var/db/timezone/needs_cleanup";  // empty marker, for the clean-up job
 inline constexpr char version_difference_record[] = "/var/db/timezone/TZVersionDiffRecord";  // the last switch
 
-// What earlier releases of the system left behind.
-inline constexpr char legacy_icu_link[] = "/var/db/icutz";               // where icu_link used to be
-inline constexpr char legacy_icu[] = "/var/db/icu";                      // no longer used, removed
-inline constexpr char legacy_zoneinfo_prefix[] = "/usr/share/zoneinfo";  // where localtime_link used to point
+// Leftovers of earlier releases of the system.
+inline constexpr char legacy_icu_link[] = "/var/db/icutz";               // earlier place of icu_link
+inline constexpr char legacy_icu[] = "/var/db/icu";                      // no longer used
+inline constexpr char legacy_zoneinfo_prefix[] = "/usr/share/zoneinfo";  // earlier target of localtime_link
 
 }  // namespace paths

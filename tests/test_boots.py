@@ -49,7 +49,7 @@ def in_full(statement):
 
 
 def create(path, kind="", text=""):
-    """Puts what the statement says in place of what is at the path."""
+    """Replaces what is at the path with what the statement says."""
     if kind == "mode":
         path.chmod(int(text, 8))
         return

@@ -56,7 +56,7 @@ def check_recovery(before):
     zoneinfo, localtime = (os.readlink(STATE + name) for name in ("zoneinfo", "localtime"))
     assert os.path.isfile(zoneinfo + "/Europe/Paris")
     assert localtime in [f"{STATE}zoneinfo/{z}" for z in ("Europe/Paris", "America/Los_Angeles")]
-    # It may be missing, or that of what was live before: no run touches the links of what it keeps.
+    # icutz may be missing or as before: no run touches the links of a dataset that it keeps.
     icu = [None, f"> {os.path.dirname(zoneinfo)}/icutz"]
     icu += [before.get(STATE + "icutz"), before.get("/var/db/icutz")]
     assert after.get(STATE + "icutz") in icu

@@ -12,16 +12,16 @@ void migrate_legacy_icu_link() noexcept {
     try {
       fs::create_symlink(fs::read_symlink(paths::legacy_icu_link).c_str(), paths::icu_link);
     } catch (...) {
-      // Programs do without the link, and the next switch creates it.
+      // ICU uses its own data without the link, and the next switch creates it.
       ::warn("Could not migrate %s to %s", paths::legacy_icu_link, paths::icu_link);
     }
   }
-  // Whatever became of the copy.
+  // Also after a failed copy.
   if (fs::path_exists(paths::legacy_icu_link)) {
     try {
       fs::remove(paths::legacy_icu_link);
     } catch (...) {
-      // No program looks there any more; the next boot tries again.
+      // No program uses the legacy link any more; the next boot tries again.
       ::warn("Could not remove %s", paths::legacy_icu_link);
     }
   }

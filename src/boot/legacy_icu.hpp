@@ -2,8 +2,8 @@
 
 namespace boot {
 
-/// Moves the legacy ICU link to the live one's place, unless something is there, and deletes it either way, even after
-/// a failed copy. A dangling link counts as absent. Failures give warnings only.
+/// Copies the legacy ICU link to the place of the live ICU link, if nothing exists there, and deletes the legacy link,
+/// even after a failed copy. A dangling link counts as missing in both places. Failures only cause warnings.
 void migrate_legacy_icu_link() noexcept;
 
 }  // namespace boot

@@ -13,12 +13,12 @@ namespace boot {
 namespace {
 
 void replace_localtime_link(const char* target) {
-  // Unlike fs::remove this removes an empty directory as well. If anything stays, create_symlink reports it.
+  // Unlike fs::remove, std::remove also removes an empty directory. If removal fails, create_symlink reports it.
   std::remove(paths::localtime_link);
   fs::create_symlink(target, paths::localtime_link);
 }
 
-/// Keeps the user's zone: accepts a link through the live zoneinfo link and rewrites one of the legacy form. Returns
+/// Keeps the user's zone: accepts a link through the live zoneinfo link, and rewrites a link of the legacy form. Returns
 /// false when the zone cannot be kept.
 bool try_keep_zone() {
   const auto target = fs::read_symlink(paths::localtime_link);

@@ -2,11 +2,11 @@
 
 namespace boot {
 
-/// Keeps a local time link that leads through the live zoneinfo link, rewrites one of the legacy form if the zone
-/// exists, and replaces anything else by America/Los_Angeles.
+/// Repairs the local time link. A link through the live zoneinfo link is kept. A link of the legacy form is rewritten if
+/// the zone exists. Anything else is replaced with a link to America/Los_Angeles.
 ///
-/// Throws errno, after a warning, when the link cannot be created: EEXIST when what was there could not be removed;
-/// otherwise that is gone.
+/// Throws errno, after a warning, when the link cannot be created. With EEXIST the old entry is still there, otherwise
+/// it has been removed.
 void repair_localtime_link();
 
 }  // namespace boot

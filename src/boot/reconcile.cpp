@@ -17,8 +17,8 @@ namespace {
 
 using dataset::vrel_dataset;
 
-/// Returns the path of the current dataset. If the zoneinfo link is missing, cannot be read or is not recognised, the
-/// system partition's data is made live first, whose path is empty.
+/// Returns the path of the current dataset, empty for the system partition's data. If the zoneinfo link is missing,
+/// cannot be read or is not recognised, makes the system partition's data live.
 std::string current_path_or_reset() {
   try {
     return current_dataset_path();
@@ -42,19 +42,20 @@ bool keep_or_reset(const vrel_dataset& current, const vrel_dataset& system) {
   return false;
 }
 
-/// Makes `to` live in place of `from`, with a marker if that was an installed dataset, and writes the record.
+/// Switches from one dataset to another: makes `to` live, creates the marker if `from` is an installed dataset, and
+/// writes the record.
 void switch_datasets(const vrel_dataset& from, const vrel_dataset& to, const vrel_dataset& system) {
   activate_all(to);
   if (!same_path(from, system)) {
     mark_needs_cleanup();
   }
-  // For information: the switch holds without the record, so a failed write is not reported.
+  // The record is for information only: a failed write is not reported and does not undo the switch.
   fs::write_file(paths::version_difference_record, version_string(from) + '_' + version_string(to));
 }
 
-/// Makes the dataset live that is to be live at this boot.
+/// Makes the right dataset live.
 ///
-/// Throws when "tz_latest" or a version is unusable, or a live link cannot be created.
+/// Throws when "tz_latest" or a version cannot be used, or a live link cannot be created.
 void reconcile_datasets() {
   const vrel_dataset system;
   const auto latest_path = latest_dataset_path();
@@ -64,7 +65,8 @@ void reconcile_datasets() {
     return;
   }
   const vrel_dataset latest(latest_path);
-  // Compared with the current dataset even if that was just rejected: the next boot judges the new one by the system's.
+  // The version is compared with that of the current dataset, even if keep_or_reset has just rejected the dataset. The
+  // next boot compares the new dataset with the system's.
   if (!all_compatible(latest, system) || !newer_than(latest, current)) {
     ::warn("New update not compatible or older version: %s vs. %s", version_string(latest).c_str(),
            version_string(current).c_str());
@@ -73,7 +75,7 @@ void reconcile_datasets() {
   switch_datasets(kept ? current : system, latest, system);
 }
 
-/// Returns whether the step comes to its end. One that fails must not keep the others from being tried.
+/// Returns whether the step completes. A step that fails must not prevent the next ones.
 bool succeeds(void (*step)()) noexcept {
   try {
     step();
@@ -88,7 +90,7 @@ bool succeeds(void (*step)()) noexcept {
 bool reconcile() noexcept {
   prepare_state_directories();
   migrate_legacy_icu_link();
-  // What an earlier run and earlier releases left. If it stays, nothing depends on it.
+  // Leftovers of earlier runs and releases; harmless if they stay.
   std::remove(paths::needs_cleanup);
   std::remove(paths::legacy_icu);
   bool live = succeeds(reconcile_datasets);

@@ -2,10 +2,10 @@
 
 namespace boot {
 
-/// Makes the dataset live that is to be live at this boot, and repairs the links around it.
+/// Makes the right dataset live and repairs the links around it.
 ///
-/// Returns false, after a warning, when even the fallback has failed, or the local time link could not be created; each
-/// is tried whatever became of the other.
+/// Returns false, after a warning, when the fallback has failed or the local time link could not be created. A failure
+/// of one does not prevent the other.
 bool reconcile() noexcept;
 
 }  // namespace boot

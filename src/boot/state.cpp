@@ -17,20 +17,21 @@ namespace {
 constexpr int protection_class = 4;
 constexpr int rejected_link = -1;
 
-/// Creates the file unless it exists. Returns whether every call succeeded; errno is that of the last that did not.
+/// Creates the file if it does not exist. Returns whether every call succeeded; otherwise errno is that of a failed call.
 bool touch(const char* path) noexcept {
   const int descriptor = platform::open_protected(path, O_RDWR | O_CREAT, protection_class, 0666);
   if (descriptor < 0) {
     return false;
   }
-  struct stat status;  // Not looked at: a failing fstat counts as a failed touch.
+  struct stat status;  // Not used; only a failure of fstat counts.
   const bool is_there = ::fstat(descriptor, &status) == 0;
   const bool closed = ::close(descriptor) == 0;
   return is_there && closed;
 }
 
-/// Returns the path of the dataset that the zoneinfo link's `target` lies in: all before the last "/", if the target
-/// begins with the dataset root and the dataset has a name; the empty string for the system partition's zone files.
+/// Returns the path of the dataset to which `target`, the target of the zoneinfo link, belongs: everything before the
+/// last "/" if the target begins with the dataset root and a name; the empty string for the system partition's zone
+/// files.
 ///
 /// Throws the `int` -1, after a warning, for every other target.
 std::string dataset_path_from_link(const std::string& target) {
@@ -51,7 +52,7 @@ std::string dataset_path_from_link(const std::string& target) {
 }  // namespace
 
 void prepare_state_directories() noexcept {
-  // The class is optional: the data can be used in any.
+  // The class is optional: the data can be used without it.
   platform::set_protection_class(paths::state_directory, protection_class);
   platform::set_protection_class(paths::dataset_root, protection_class);
 }
@@ -62,7 +63,7 @@ std::string current_dataset_path() { return dataset_path_from_link(fs::read_syml
 
 void mark_needs_cleanup() noexcept {
   if (!touch(paths::needs_cleanup)) {
-    // The data that is live is right all the same; only the clean-up has to wait.
+    // The live data is right all the same; only the clean-up has to wait.
     ::warn("Cannot touch file %s", paths::needs_cleanup);
   }
 }

@@ -4,20 +4,20 @@
 
 namespace dataset {
 
-/// One kind of data in a dataset. It is read when the component is built. `std::make_shared` of the concrete class
-/// creates it, so that the handle destroys that class: the destructor here is not virtual.
+/// One kind of data in a dataset, read by the constructor. Create components with `std::make_shared` of the concrete
+/// class: the destructor is not virtual, and such a handle calls the right one.
 class vrel_dataset_component {
  public:
   vrel_dataset_component(const vrel_dataset_component&) = delete;
   vrel_dataset_component& operator=(const vrel_dataset_component&) = delete;
 
-  /// Returns whether this data and that of another dataset can stand in for each other.
+  /// Returns whether this data and the `other` dataset's data can replace each other.
   virtual bool compatible_schema(const vrel_dataset_component* other) const = 0;
 
-  /// Removes the live link of this kind of data, a failure giving warnings only, and creates it anew.
+  /// Removes the live link of this kind of data and creates it again. A failed removal only causes warnings.
   ///
-  /// Throws errno, after a warning, when it cannot be created: EEXIST when the old one is still there; otherwise it is
-  /// missing.
+  /// Throws errno, after a warning, when the link cannot be created. With EEXIST the old link is still there, otherwise
+  /// there is no link.
   virtual void activate() const = 0;
 
  protected:
@@ -27,7 +27,8 @@ class vrel_dataset_component {
   const std::string dataset_path_;  // empty: the system partition
 };
 
-/// The compiled zone files of the dataset at a path, of the system partition if that is empty. Any fit any others.
+/// The compiled zone files of the dataset at a path, or of the system partition if the path is empty. All zone files are
+/// compatible.
 class vrel_zoneinfo final : public vrel_dataset_component {
  public:
   explicit vrel_zoneinfo(const std::string& path = {});

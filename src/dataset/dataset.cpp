@@ -12,8 +12,8 @@
 namespace dataset {
 namespace {
 
-/// Returns what follows the dataset root in the path of an installed dataset. Warns and throws
-/// `std::invalid_argument` when nothing does or the path is elsewhere.
+/// Returns the part of an installed dataset's path after the dataset root. Warns and throws `std::invalid_argument` when
+/// the part is empty or the path does not begin with the root.
 std::string version_from_path(const std::string& path) {
   constexpr std::string_view root = paths::dataset_root;
   if (path.size() <= root.size() || !path.starts_with(root)) {
@@ -36,7 +36,7 @@ void vrel_dataset::create_components() {
 }
 
 void vrel_dataset::reset_to_system() {
-  // Read anew: the fallback has no such dataset if reading it has just failed. Its warnings then come twice.
+  // Reads the system dataset again, because the first attempt may have failed. Its warnings can therefore appear twice.
   const vrel_dataset system;
   activate_all(system);
 }

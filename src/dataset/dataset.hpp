@@ -9,14 +9,14 @@
 
 namespace dataset {
 
-/// One complete set of time-zone data that can be made live. It is read when it is built.
+/// One complete set of time-zone data that can be made live. The constructor reads it.
 class vrel_dataset {
  public:
-  /// The dataset at `path`, which is "/var/db/timezone/tz/" and its version string and need not exist; that of the
-  /// system partition if empty, whose version string ends in ".1.0".
+  /// Reads the dataset at `path`, which is "/var/db/timezone/tz/" followed by the version string. The directory need not
+  /// exist. With an empty path, reads the system partition's dataset, whose version string ends in ".1.0".
   ///
-  /// Throws `std::invalid_argument` "badpath", after a warning, for a path of any other form, and what parsing the
-  /// version and reading the ICU data throw.
+  /// Throws `std::invalid_argument` "badpath", after a warning, for a path of another form, and what `parse_version` and
+  /// the constructor of `vrel_icu` throw.
   explicit vrel_dataset(const std::string& path = {});
 
   vrel_dataset(const vrel_dataset&) = delete;
@@ -31,7 +31,7 @@ class vrel_dataset {
   /// Returns whether each component of `a` is compatible with its counterpart in `b`.
   friend bool all_compatible(const vrel_dataset& a, const vrel_dataset& b);
 
-  /// Makes `d` live. Throws errno when a link cannot be created; those after it are not touched.
+  /// Makes `d` live. Throws errno when a link cannot be created; the links after it are not touched.
   friend void activate_all(const vrel_dataset& d);
 
   friend std::string version_string(const vrel_dataset& d);

@@ -6,18 +6,18 @@
 
 namespace dataset {
 
-/// The ICU data of the dataset at a path, of the system partition if that is empty. It has a schema, such as 44l, and
-/// fits only data of the same schema, an empty one included.
+/// The ICU data of the dataset at a path, or of the system partition if the path is empty. The data has a schema, such
+/// as 44l, which can be empty, and is compatible only with data of the same schema.
 class vrel_icu final : public vrel_dataset_component {
  public:
-  /// Installed data without a schema gives a warning. Throws errno, after a warning, when memory for reading the
-  /// directory runs out (ENOMEM).
+  /// Warns when installed data has no schema. Throws errno, after a warning, when memory for reading the directory runs
+  /// out (ENOMEM).
   explicit vrel_icu(const std::string& path = {});
 
   /// Warns when `other` is no ICU data.
   bool compatible_schema(const vrel_dataset_component* other) const override;
 
-  /// Also removes the legacy link, unless the live link cannot be removed. For the system's data no link is created.
+  /// Also removes the legacy link, unless the live link cannot be removed. Creates no link for the system's data.
   void activate() const override;
 
  private:

@@ -27,7 +27,7 @@ class file {
   file(const file&) = delete;
   file& operator=(const file&) = delete;
 
-  /// Returns whether this is open and neither a FIFO, a socket nor a device. A directory passes, since reading it fails
+  /// Returns whether the file is open and neither a FIFO, a socket nor a device. A directory passes: reading it fails
   /// with an errno value that says what is wrong.
   bool is_usable() const noexcept {
     struct stat status;

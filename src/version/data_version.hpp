@@ -5,8 +5,8 @@
 
 namespace version {
 
-/// A dataset's version, such as 2020a.1.0, parsed. The default value stands for the absence of a valid version and
-/// is older than every valid one.
+/// A dataset's version, such as 2020a.1.0, parsed. The default value stands for no valid version, and is older than
+/// every valid version.
 struct data_version {
   data_version() = default;
 
@@ -26,10 +26,10 @@ struct data_version {
 void parse_version(data_version& version, const std::string& text);
 
 /// Returns whether `a` is strictly newer than `b`, by year, letters (as bytes, a longer string after its prefix),
-/// major and minor number. A number that is not given is older than any that is.
+/// major and minor number. A missing number is older than any number.
 bool newer_than(const data_version& a, const data_version& b) noexcept;
 
-/// Returns whether all four fields are equal, which is when neither version is newer.
+/// Returns whether all four fields are equal.
 bool same_version(const data_version& a, const data_version& b) noexcept;
 
 }  // namespace version
