@@ -17,7 +17,8 @@ namespace {
 constexpr int protection_class = 4;
 constexpr int rejected_link = -1;
 
-/// Creates the file if it does not exist. Returns whether every call succeeded; otherwise errno is that of a failed call.
+/// Creates the file if it does not exist. Returns whether every call succeeded; otherwise errno is that of a failed
+/// call.
 bool touch(const char* path) noexcept {
   const int descriptor = platform::open_protected(path, O_RDWR | O_CREAT, protection_class, 0666);
   if (descriptor < 0) {

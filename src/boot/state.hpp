@@ -8,7 +8,8 @@ namespace boot {
 /// neither. Failures cause no warning.
 void prepare_state_directories() noexcept;
 
-/// Returns the target of "tz_latest", not validated; empty when there is no link. Throws what `fs::read_symlink` throws.
+/// Returns the target of "tz_latest", not validated; empty when there is no link. Throws what `fs::read_symlink`
+/// throws.
 std::string latest_dataset_path();
 
 /// Returns the path of the dataset that the live zoneinfo link points into, empty for the system partition.

@@ -27,8 +27,8 @@ class vrel_dataset_component {
   const std::string dataset_path_;  // empty: the system partition
 };
 
-/// The compiled zone files of the dataset at a path, or of the system partition if the path is empty. All zone files are
-/// compatible.
+/// The compiled zone files of the dataset at a path, or of the system partition if the path is empty. All zone files
+/// are compatible.
 class vrel_zoneinfo final : public vrel_dataset_component {
  public:
   explicit vrel_zoneinfo(const std::string& path = {});

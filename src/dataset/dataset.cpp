@@ -12,8 +12,8 @@
 namespace dataset {
 namespace {
 
-/// Returns the part of an installed dataset's path after the dataset root. Warns and throws `std::invalid_argument` when
-/// the part is empty or the path does not begin with the root.
+/// Returns the part of an installed dataset's path after the dataset root. Warns and throws `std::invalid_argument`
+/// when the part is empty or the path does not begin with the root.
 std::string version_from_path(const std::string& path) {
   constexpr std::string_view root = paths::dataset_root;
   if (path.size() <= root.size() || !path.starts_with(root)) {

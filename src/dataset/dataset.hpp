@@ -12,11 +12,11 @@ namespace dataset {
 /// One complete set of time-zone data that can be made live. The constructor reads it.
 class vrel_dataset {
  public:
-  /// Reads the dataset at `path`, which is "/var/db/timezone/tz/" followed by the version string. The directory need not
-  /// exist. With an empty path, reads the system partition's dataset, whose version string ends in ".1.0".
+  /// Reads the dataset at `path`, which is "/var/db/timezone/tz/" followed by the version string. The directory need
+  /// not exist. With an empty path, reads the system partition's dataset, whose version string ends in ".1.0".
   ///
-  /// Throws `std::invalid_argument` "badpath", after a warning, for a path of another form, and what `parse_version` and
-  /// the constructor of `vrel_icu` throw.
+  /// Throws `std::invalid_argument` "badpath", after a warning, for a path of another form, and what `parse_version`
+  /// and the constructor of `vrel_icu` throw.
   explicit vrel_dataset(const std::string& path = {});
 
   vrel_dataset(const vrel_dataset&) = delete;
