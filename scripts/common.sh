@@ -26,7 +26,7 @@ build() {
   cmake --build "build/${2:-$1}" -- --quiet
 }
 
-# in_sandbox: whether this is a sandbox.
+# in_sandbox: succeeds in a sandbox.
 in_sandbox() { grep -q '^tzreconcile-sandbox /var ' /proc/self/mounts; }
 
 # sandbox COMMAND...: runs the command at the top of the tree in a private mount namespace, with empty file systems on
@@ -43,23 +43,22 @@ sysctl user.max_user_namespaces=10000 and, where it exists, kernel.apparmor_rest
     mount -t tmpfs tzreconcile-sandbox /var
     mount -t tmpfs tzreconcile-sandbox /usr/share
     mount -t tmpfs tzreconcile-sandbox /run
-    cp -a /etc /run 2>/dev/null || true # but for what only root can read
+    cp -a /etc /run 2>/dev/null || true # without files that only root can read
     mount --bind /run/etc /etc
     ln -sfn /var/db/timezone/localtime /etc/localtime
     exec "$@"' sandbox "$@"
 }
 
-# stage_system SHARE VERSION SOURCE: puts zone files of the zone source into the system partition, whose /usr/share is
-# SHARE.
+# stage_system VERSION: makes the system dataset of the sandbox, with the zones in build/tzdata.zi.
 stage_system() {
-  mkdir -p "$1/icu"
-  zic -d "$1/zoneinfo.default" "$3"
-  echo "$2" >"$1/zoneinfo.default/+VERSION"
-  echo 44l >"$1/icu/icutzformat.txt"
+  mkdir -p /usr/share/icu
+  zic -d /usr/share/zoneinfo.default build/tzdata.zi
+  echo "$1" >/usr/share/zoneinfo.default/+VERSION
+  echo 44l >/usr/share/icu/icutzformat.txt
 }
 
-# make_update DIRECTORY SCHEMA: makes the dataset that an update brings. Paris is two hours east of UTC in it, the whole
-# year; its ICU data is ICU's own, with the dataset's version.
+# make_update DIRECTORY SCHEMA: makes a dataset in which Paris is two hours east of UTC all year. Its ICU files are
+# ICU's own with the version replaced.
 make_update() {
   mkdir -p "$1/zoneinfo" "$1/icutz"
   printf 'Zone Europe/Paris 2 - CEST\nZone America/Los_Angeles -8 - PST\n' | zic -d "$1/zoneinfo" -

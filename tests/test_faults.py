@@ -25,7 +25,8 @@ TRACE = Path("build/trace").absolute()
 
 
 def calls(trace, wanted):
-    """Returns the wanted system calls of a trace, each with the option that injects a fault."""
+    """Returns the system calls of a trace that match the first of the wanted patterns, after the call
+    that begins with the second, each with the option that injects a fault."""
     counts, started, found = Counter(), False, []
     for line in re.findall(r"^\w+\(.* = .*", trace, re.MULTILINE):
         name = line.partition("(")[0]

@@ -18,7 +18,7 @@ void replace_localtime_link(const char* target) {
   fs::create_symlink(target, paths::localtime_link);
 }
 
-/// Keeps the user's zone: accepts a link through the live zoneinfo link, and rewrites a link of the legacy form.
+/// Keeps the user's zone: accepts a target through the live zoneinfo link, and rewrites a target of the legacy form.
 /// Returns false when the zone cannot be kept.
 bool try_keep_zone() {
   const auto target = fs::read_symlink(paths::localtime_link);

@@ -30,8 +30,8 @@ std::string current_path_or_reset() {
   }
 }
 
-/// Makes the system partition's data live unless the current dataset has its schema and is not older. Returns whether
-/// the current dataset stays live.
+/// Makes the system partition's data live, and creates the marker, unless the current dataset has its schema and is not
+/// older. Returns whether the current dataset stays live.
 bool keep_or_reset(const vrel_dataset& current, const vrel_dataset& system) {
   if (all_compatible(current, system) && !newer_than(system, current)) {
     return true;
@@ -65,8 +65,8 @@ void reconcile_datasets() {
     return;
   }
   const vrel_dataset latest(latest_path);
-  // The version is compared with that of the current dataset, even if keep_or_reset has just rejected the dataset. The
-  // next boot compares the new dataset with the system's.
+  // `latest` is compared with `current` even if keep_or_reset has just rejected `current`. If `latest` is older than
+  // the system dataset, the next boot rejects it.
   if (!all_compatible(latest, system) || !newer_than(latest, current)) {
     ::warn("New update not compatible or older version: %s vs. %s", version_string(latest).c_str(),
            version_string(current).c_str());

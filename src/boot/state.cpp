@@ -24,15 +24,14 @@ bool touch(const char* path) noexcept {
   if (descriptor < 0) {
     return false;
   }
-  struct stat status;  // Not used; only a failure of fstat counts.
+  struct stat status;  // Not used. A file that has no status is not there after all.
   const bool is_there = ::fstat(descriptor, &status) == 0;
   const bool closed = ::close(descriptor) == 0;
   return is_there && closed;
 }
 
-/// Returns the path of the dataset to which `target`, the target of the zoneinfo link, belongs: everything before the
-/// last "/" if the target begins with the dataset root and a name; the empty string for the system partition's zone
-/// files.
+/// Returns the path of the dataset to which `target`, the target of the zoneinfo link, belongs. For the dataset root, a
+/// name, a "/" and anything, this is what is before the last "/". For the system partition's zone files it is empty.
 ///
 /// Throws the `int` -1, after a warning, for every other target.
 std::string dataset_path_from_link(const std::string& target) {

@@ -4,11 +4,11 @@
 
 namespace boot {
 
-/// Gives the state directory and the dataset root their data-protection class, where the platform has them. Creates
+/// On a platform with data-protection classes, gives the state directory and the dataset root their class. Creates
 /// neither. Failures cause no warning.
 void prepare_state_directories() noexcept;
 
-/// Returns the target of "tz_latest", not validated; empty when there is no link. Throws what `fs::read_symlink`
+/// Returns the target of "tz_latest", not validated; empty when nothing is there. Throws what `fs::read_symlink`
 /// throws.
 std::string latest_dataset_path();
 

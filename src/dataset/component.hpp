@@ -5,19 +5,19 @@
 namespace dataset {
 
 /// One kind of data in a dataset, read by the constructor. Create components with `std::make_shared` of the concrete
-/// class: the destructor is not virtual, and such a handle calls the right one.
+/// class: the destructor is not virtual, and such a handle remembers the class.
 class vrel_dataset_component {
  public:
   vrel_dataset_component(const vrel_dataset_component&) = delete;
   vrel_dataset_component& operator=(const vrel_dataset_component&) = delete;
 
-  /// Returns whether this data and the `other` dataset's data can replace each other.
+  /// Returns whether this data and `other`, the same kind of data of another dataset, can replace each other.
   virtual bool compatible_schema(const vrel_dataset_component* other) const = 0;
 
   /// Removes the live link of this kind of data and creates it again. A failed removal only causes warnings.
   ///
-  /// Throws errno, after a warning, when the link cannot be created. With EEXIST the old link is still there, otherwise
-  /// there is no link.
+  /// Throws errno, after a warning, when the link cannot be created. With EEXIST the old entry is still there,
+  /// otherwise there is no link.
   virtual void activate() const = 0;
 
  protected:

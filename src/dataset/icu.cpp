@@ -86,8 +86,8 @@ void vrel_icu::activate() const {
     fs::remove(paths::icu_link);
     fs::remove(paths::legacy_icu_link);
   } catch (...) {
-    // For installed data, creating the new link fails if the old one is still there. The system's data needs no link,
-    // and a legacy link that stays is in nobody's way.
+    // For installed data, creating the new link fails if the old entry is still there. For the system's data, an old
+    // live link may stay, and only the warning tells. No program uses the legacy link.
     ::warn("unlink of ICU softlink failed");
   }
   if (!dataset_path_.empty()) {

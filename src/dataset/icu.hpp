@@ -7,7 +7,7 @@
 namespace dataset {
 
 /// The ICU data of the dataset at a path, or of the system partition if the path is empty. The data has a schema, such
-/// as 44l, which can be empty, and is compatible only with data of the same schema.
+/// as 44l. The schema can be empty. Data is compatible only with data of the same schema.
 class vrel_icu final : public vrel_dataset_component {
  public:
   /// Warns when installed data has no schema. Throws errno, after a warning, when memory for reading the directory runs

@@ -3,8 +3,8 @@
 #include <string>
 #include <string_view>
 
-/// File-system operations. A failure goes through `warn_and_raise`, unless the comment of the operation says otherwise;
-/// nothing has changed on disk then.
+/// File-system operations. An operation that fails changes nothing on disk and calls `warn_and_raise`, unless its
+/// comment says otherwise.
 namespace fs {
 
 /// Warns with the message and the text of errno, then throws the errno value as an `int`.
@@ -16,7 +16,7 @@ void remove(const char* path);
 /// Returns whether the path exists once every link is followed: false for a dangling link.
 bool path_exists(const char* path) noexcept;
 
-/// Returns the target of the link, at most 1024 bytes; empty when nothing is there. Throws EINVAL for anything but a
+/// Returns the target of the link, cut to 1024 bytes; empty when nothing is there. Throws EINVAL for anything but a
 /// link.
 std::string read_symlink(const char* path);
 
@@ -28,7 +28,7 @@ void create_symlink(const char* target, const char* link);
 std::string first_word(const char* path);
 
 /// Replaces the content of a regular file, or creates it with mode 0666 less the umask. Never waits for a FIFO or a
-/// device. A failure causes no warning; the file may then contain only the beginning of the text.
+/// device. A link is followed. A failure causes no warning; the file may then be empty or incomplete.
 void write_file(const char* path, std::string_view text) noexcept;
 
 }  // namespace fs

@@ -13,8 +13,8 @@ namespace {
 constexpr std::string_view digits = "0123456789";
 constexpr std::string_view lower_case = "abcdefghijklmnopqrstuvwxyz";
 
-/// The four groups of ([0-9]+)([a-z]+)(?:\.([0-9]+))?(?:\.([0-9]+))? in a text that matches it as a whole. The
-/// numbers are empty when not given.
+/// The four groups of ([0-9]+)([a-z]+)(?:\.([0-9]+))?(?:\.([0-9]+))? in a text that matches it as a whole. `major`
+/// and `minor` are empty when not given.
 struct version_groups {
   std::string_view year;
   std::string_view letters;
@@ -43,8 +43,8 @@ std::string_view take_dotted_number(std::string_view& text) {
   return number;
 }
 
-// One pass suffices: no group can begin with a byte that the group before it takes. std::regex would dominate the run
-// time, and overflow the stack at a long text.
+// One pass suffices: no group can begin with a byte that the group before it can take. std::regex would dominate the
+// run time, and overflow the stack at a long text.
 std::optional<version_groups> match(std::string_view text) {
   version_groups groups;
   groups.year = take_run(text, digits);

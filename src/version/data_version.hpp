@@ -22,7 +22,7 @@ struct data_version {
 /// Parses a version string: decimal digits, lower-case letters, then up to two times a dot and decimal digits, with
 /// nothing before, between or after. Any other text gives two warnings and resets `version` to its default.
 ///
-/// Throws `std::out_of_range`, without a warning, for a number above 2147483647.
+/// Throws `std::out_of_range`, without a warning, for a number above 2147483647; the fields before it are set then.
 void parse_version(data_version& version, const std::string& text);
 
 /// Returns whether `a` is strictly newer than `b`, by year, letters (as bytes, a longer string after its prefix),
