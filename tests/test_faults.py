@@ -7,7 +7,7 @@ from pathlib import Path
 
 import pytest
 
-from test_boots import BINARIES, STATE, create, read_disk, run, stage
+from test_boots import RELEASE, STATE, create, read_disk, run, stage
 
 # Together they reach every call that a run can make.
 SITUATIONS = [
@@ -40,7 +40,7 @@ def calls(trace, wanted):
 
 def traced_run(*options):
     """Returns the exit status and the trace of a run."""
-    status, _ = run(["strace", f"-o{TRACE}", *options, *BINARIES["release"]])
+    status, _ = run(["strace", f"-o{TRACE}", *options, *RELEASE])
     return status, TRACE.read_text()
 
 
