@@ -1,7 +1,4 @@
-"""Stages each situation of boots.txt, boots, and compares all that the boot leaves behind.
-
-boots.txt explains the notation.
-"""
+"""Stages each situation of boots.txt, boots, and compares all that the boot leaves behind."""
 
 import difflib
 import os
@@ -93,11 +90,11 @@ def read_disk():
 
 def compare(expected, seen):
     """Fails with the lines that differ. What is compared has one value or a list for each name."""
-    lines = [[], []]
-    for side, values in zip(lines, (expected, seen)):
-        for name, value in sorted(values.items()):
-            side += [f"{name} {v}" for v in (value if isinstance(value, list) else [value])]
-    differs = [ascii(line)[1:-1] for line in difflib.ndiff(*lines) if line[0] in "-+"]
+
+    def as_lines(values):
+        return [f"{n} {v}" for n, vs in sorted(values.items()) for v in (vs if isinstance(vs, list) else [vs])]
+
+    differs = [ascii(line)[1:-1] for line in difflib.ndiff(as_lines(expected), as_lines(seen)) if line[0] in "-+"]
     if differs:
         pytest.fail("\n".join(differs), pytrace=False)
 

@@ -1,7 +1,6 @@
-"""Runs the programs in libexec in situations as in boots.txt, with the tools of GNU and of busybox.
+"""Runs the programs in libexec in situations as in boots.txt, with the tools of GNU and of busybox."""
 
-A line of a table is an outcome, and after "<=" the situations that have it, with "|" between them.
-"""
+# A line of a table is an outcome, and after "<=" the situations that have it, with "|" between them.
 
 import os
 from pathlib import Path
@@ -16,6 +15,7 @@ STUBS = Path("build/stubs").absolute()
 TZ = f"{STATE}tz/"
 NEW = "/var/new/2022a.1.0"
 INSTALL, CLEAN_UP, CHECK = ["sh", "libexec/install-dataset", NEW], ["sh", "libexec/clean-up"], ["sh", "libexec/check"]
+LIVE, SYSTEM = "tz/2021b.1.0", "/usr/share/zoneinfo.default"
 UPDATED = "live 2021b.1.0, latest 2021b.1.0, dataset ../../../new/2022a.1.0, "
 NAME = f"{NEW} -, dataset ../../../new/"
 
@@ -50,7 +50,6 @@ tz/2022a.1.0 -, latest 2022a.1.0 <= tz/2022a.1.0 > . | tz/2022a.1.0 =
 tz_latest > @2022a.1.0 <= dataset 2022a.1.0, tz/2022a.1.0/x =
 latest 2022a.1.0, tz/2022a.1.0/zoneinfo/x > Europe <= {NEW}/zoneinfo/x > Europe
 latest 2022a <= {NAME}2022a
-latest 2022ab.9 <= {NAME}2022ab.9
 latest 999999999z.0.999999999 <= {NAME}999999999z.0.999999999
 ! no version <= {NAME}2022 | {NAME}a | {NAME}2022aB | {NAME}2022a. | {NAME}2022a.1.0.3 | {NAME}2147483648a
 ! no version <= {NAME}2022a\\n | {NAME}x\\n2022a
@@ -96,19 +95,14 @@ def test_clean_up(situation, kept, start):
     for name in ("a b", "-f", "*", ".x", "..y", "x\ny") if "needs" in situation or "marker" in situation else []:
         create(Path(TZ, name, name), "=")
     assert start(*CLEAN_UP) == (0, [])
-    kept = ["", *kept.split()]
-    compare({p: v for p, v in stays.items() if p.removeprefix(TZ).split("/")[0] in kept}, read_disk())
+    compare({p: v for p, v in stays.items() if p.removeprefix(TZ).split("/")[0] in ["", *kept.split()]}, read_disk())
 
 
 def test_clean_up_of_what_cannot_be_deleted(start):
     stage(f"{UPDATED}dataset 2020a.1.0, dataset 2020b.1.0, dataset 2022a.1.0, marker")
-    mount = f"mount -t tmpfs none {TZ}2022a.1.0/zoneinfo && sh libexec/clean-up || sh libexec/install-dataset {NEW} && exit 9"
-    status, texts = start("unshare", "--mount", "sh", "-c", mount)
-    assert (
-        status == 9
-        and "zoneinfo" in texts[0]
-        and sorted(os.listdir(TZ)) == [".unused.2022a.1.0", "2021b.1.0", "2022a.1.0"]
-    )
+    script = f"mount -t tmpfs x {TZ}2022a.1.0/icutz; sh libexec/clean-up || sh libexec/install-dataset {NEW} && exit 9"
+    status, texts = start("unshare", "--mount", "sh", "-c", script)
+    assert status == 9 and "icutz" in texts[0] and sorted(os.listdir(TZ))[:2] == [".unused.2022a.1.0", "2021b.1.0"]
     run()
     assert start(*CLEAN_UP) == (0, []) and os.listdir(TZ) == ["2022a.1.0"]
 
@@ -134,9 +128,8 @@ strace -o{0} {2} /bin/${{0##*/}} "$@"; status=$?
 """
 # The system calls that change the disk.
 CHANGE = r"mkdir|rename|symlink|link|unlink|rmdir|copy_|sendfile|write|f?chmod|f?sync|.*O_CREAT"
-WHOLE = "dataset 2022a.1.0"
-FAULTY = f"tz/2022a.1.0/icutz/x =, {WHOLE}, tz/2022a.1.0/zoneinfo/x > y"  # The first deletions heal it.
-KILLS = [(INSTALL, FAULTY, 0), (CLEAN_UP, WHOLE, 0), (CLEAN_UP, WHOLE, "-T")]
+FAULTY = "tz/2022a.1.0/icutz/x =, dataset 2022a.1.0, tz/2022a.1.0/zoneinfo/x > y"  # The first deletions heal it.
+KILLS = [(INSTALL, FAULTY, 0), (CLEAN_UP, "dataset 2022a.1.0", 0), (CLEAN_UP, "dataset 2022a.1.0", "-T")]
 
 
 # The shell of busybox has its tools built in.
@@ -147,8 +140,7 @@ def test_kill(program, unused, fails, start):
         stage(f"{UPDATED}{unused}, tz/.new.x/y =, marker")
         for tool in "rm mktemp ln mkdir cp chmod sync mv".split():
             stub(tool, TRACED.format(TRACE, number, injection, fails).replace("\\", r"\\"))
-        for path in (TRACE, Path(f"{TRACE}.tools")):
-            path.unlink(missing_ok=True)
+        run(["rm", "-f", TRACE, f"{TRACE}.tools"])
         status, _ = start(*program)
         create(STUBS, "/")
         return status
@@ -175,18 +167,17 @@ def test_kill(program, unused, fails, start):
 
 
 # What check finds; the command that it prints repairs what is wrong.
-VERDICTS = """
-<= | live system, tz_latest - | /usr/share/icu/icutzformat.txt -, tz/2021b.1.0/icutz - | icutz > tz/2021b.1.0/icutz
+VERDICTS = f"""
+<= | live system, tz_latest - | /usr/share/icu/icutzformat.txt -, {LIVE}/icutz - | icutz > {LIVE}/icutz
 <= localtime > /usr/share/zoneinfo/Europe/Paris | /etc/localtime > ../var/db/timezone/localtime | latest 2022a.1.0
 wrong: no directory <= live system, tz_latest -, tz -
-wrong: zoneinfo <= zoneinfo - | zoneinfo / | zoneinfo > tz/2021b.1.0/zoneinfo | zoneinfo > @2021b.1.0/icutz
-wrong: zoneinfo <= zoneinfo > @2021b.1.0 | zoneinfo > @2021b.1.0/ | zoneinfo > /usr/share/zoneinfo.default/
-wrong: no zone files in /var <= tz/2021b.1.0/zoneinfo - | latest 2022a.1.0, tz/2022a.1.0/zoneinfo -
-wrong: not world-readable: /var <= tz/2021b.1.0/zoneinfo/Europe/Paris mode 640 | tz/2021b.1.0/icutz mode 711
-wrong: not world-readable: /usr <= /usr/share/zoneinfo.default/Europe mode 750
+wrong: zoneinfo <= zoneinfo - | zoneinfo / | zoneinfo > {LIVE}/zoneinfo | zoneinfo > @2021b.1.0/icutz
+wrong: zoneinfo <= zoneinfo > @2021b.1.0 | zoneinfo > @2021b.1.0/ | zoneinfo > {SYSTEM}/
+wrong: no zone files in /var <= {LIVE}/zoneinfo - | latest 2022a.1.0, tz/2022a.1.0/zoneinfo -
+wrong: no zone files in /usr <= {SYSTEM}/Europe -, {SYSTEM}/America -
+wrong: not world-readable <= {LIVE}/zoneinfo/Europe/Paris mode 640 | {LIVE}/icutz mode 711 | {SYSTEM}/Europe mode 750
 wrong: not every user can enter <= /var/db mode 750 | tz mode 700
-wrong: no zone files in /usr <= /usr/share/zoneinfo.default/Europe -, /usr/share/zoneinfo.default/America -
-wrong: no version <= /usr/share/zoneinfo.default/+VERSION - | /usr/share/zoneinfo.default/+VERSION = 2021a.1
+wrong: no version <= {SYSTEM}/+VERSION - | {SYSTEM}/+VERSION = 2021a.1
 wrong: icutz exists <= live system, icutz > @2021b.1.0/icutz | live system, icutz > x | live system, icutz /
 wrong: icutz does not <= icutz - | icutz > @2021b.1.0/zoneinfo | icutz /
 wrong: the live dataset has schema 44l, the system 46l <= /usr/share/icu/icutzformat.txt = 46l
