@@ -128,8 +128,11 @@ strace -o{0} {2} /bin/${{0##*/}} "$@"; status=$?
 """
 # The system calls that change the disk.
 CHANGE = r"mkdir|rename|symlink|link|unlink|rmdir|copy_|sendfile|write|f?chmod|f?sync|.*O_CREAT"
-FAULTY = "tz/2022a.1.0/icutz/x =, dataset 2022a.1.0, tz/2022a.1.0/zoneinfo/x > y"  # The first deletions heal it.
-KILLS = [(INSTALL, FAULTY, 0), (CLEAN_UP, "dataset 2022a.1.0", 0), (CLEAN_UP, "dataset 2022a.1.0", "-T")]
+# In tmpfs the newest files are deleted first: what is left looks whole to the end, and FAULTY is healed first.
+OLD = "tz/2022a.1.0"
+UNUSED = f"{OLD}/icutz/x =, {OLD}/zoneinfo/America/x =, dataset 2022a.1.0, {OLD}/icutz/x -, {OLD}/zoneinfo/America/x -"
+FAULTY = f"{UNUSED}, {OLD}/zoneinfo/x > y"
+KILLS = [(INSTALL, FAULTY, 0), (CLEAN_UP, UNUSED, 0), (CLEAN_UP, UNUSED, "-T")]
 
 
 # The shell of busybox has its tools built in.
