@@ -48,7 +48,7 @@ latest 2022a.1.0, tz/2022a.1.0 mode 755 <= dataset 2022a.1.0, tz/2022a.1.0 mode 
 latest 2022a.1.0, tz/2022a.1.0/zoneinfo mode 755 <= dataset 2022a.1.0, tz/2022a.1.0/zoneinfo mode 744
 tz/2022a.1.0 -, latest 2022a.1.0 <= tz/2022a.1.0 > . | tz/2022a.1.0 =
 tz_latest > @2022a.1.0 <= dataset 2022a.1.0, tz/2022a.1.0/x =
-latest 2022a.1.0, tz/2022a.1.0/zoneinfo/x > Europe <= {NEW}/zoneinfo/x > Europe
+latest 2022a.1.0, tz/2022a.1.0/zoneinfo/x > Europe <= ../data /, tz > ../data, live 2021b.1.0, {NEW}/zoneinfo/x > Europe
 latest 2022a <= {NAME}2022a
 latest 999999999z.0.999999999 <= {NAME}999999999z.0.999999999
 ! no version <= {NAME}2022 | {NAME}a | {NAME}2022aB | {NAME}2022a. | {NAME}2022a.1.0.3 | {NAME}2147483648a
@@ -58,7 +58,7 @@ dataset 2022a.1.0 ! directory <= tz_latest /
 ! no zone file zoneinfo/America/Los_Angeles <= {NEW}/zoneinfo/America - | {NEW}/zoneinfo/America/Los_Angeles = x
 ! ./zoneinfo -> z <= {NEW}/zoneinfo > z, {NEW}/z/America/Los_Angeles = TZif
 ! ./zoneinfo/x -> /etc/localtime <= {NEW}/zoneinfo/x > /etc/localtime
-! ./zoneinfo/x -> <= {NEW}/zoneinfo/x > y | {NEW}/zoneinfo/x > ../.. | {NEW}/zoneinfo/x > x
+! ./zoneinfo/x -> <= {NEW}/zoneinfo/x > y | {NEW}/zoneinfo/x > .. | {NEW}/zoneinfo/x > x
 ! special file: ./zoneinfo/x <= {NEW}/zoneinfo/x fifo
 ! not exactly one <= dataset 2022a.1.0, tz/2022a.1.0/x > y, {NEW}/icutz/icutz44l.dat -
 ! not exactly one <= {NEW}/icutz/icutz4b.dat = | {NEW}/icutz/icutz44l.dat > /bin
@@ -80,8 +80,8 @@ def test_installation(situation, outcome, start):
 CLEAN_UPS = """
 2021b.1.0 2022a.1.0 <= latest 2022a.1.0, live 2021b.1.0, dataset 2020a.1.0, dataset 2021b.1.01, marker
 2021b.1.0 <= live 2021b.1.0, tz/l > 2021b.1.0, tz/f fifo, marker
-2021b.1.0 <= icutz > @2021b.1.0/icutz, dataset 2021b.1.0, marker
-2021b.1.0 <= zoneinfo > tz/2021b.1.0/zoneinfo, dataset 2021b.1.0, dataset 1.0, needs_cleanup.begun =
+2021b.1.0 <= icutz > @2021b.1.0/icutz, dataset 2021b.1.0, marker | live 2021b.1.0, dataset 1.0, needs_cleanup /
+2021b.1.0 <= ../data /, tz > ../data, zoneinfo > tz/2021b.1.0/zoneinfo, dataset 2021b.1.0, needs_cleanup.begun =
 2021b.1.0 <= zoneinfo > @2021b.1.0/x/zoneinfo, dataset 2021b.1.0, tz_latest > @x, dataset 2020a.1.0, marker
 2021b.1.0 x <= live system, tz_latest > @x, tz/x > 2021b.1.0, dataset 2021b.1.0, dataset 2020a.1.0, marker
 2020a.1.0 2021b.1.0 <= live 2021b.1.0, dataset 2020a.1.0
@@ -99,10 +99,10 @@ def test_clean_up(situation, kept, start):
 
 
 def test_clean_up_of_what_cannot_be_deleted(start):
-    stage(f"{UPDATED}dataset 2020a.1.0, dataset 2020b.1.0, dataset 2022a.1.0, marker")
+    stage(f"{UPDATED}dataset 2022a.1.0, dataset 2022b.1.0, dataset 2023a.1.0, marker")
     script = f"mount -t tmpfs x {TZ}2022a.1.0/icutz; sh libexec/clean-up || sh libexec/install-dataset {NEW} && exit 9"
     status, texts = start("unshare", "--mount", "sh", "-c", script)
-    assert status == 9 and "icutz" in texts[0] and sorted(os.listdir(TZ))[:2] == [".unused.2022a.1.0", "2021b.1.0"]
+    assert status == 9 and "icutz" in texts[0] and sorted(os.listdir(TZ))[1:] == ["2021b.1.0", "2022a.1.0"]
     run()
     assert start(*CLEAN_UP) == (0, []) and os.listdir(TZ) == ["2022a.1.0"]
 
@@ -173,6 +173,7 @@ def test_kill(program, unused, fails, start):
 VERDICTS = f"""
 <= | live system, tz_latest - | /usr/share/icu/icutzformat.txt -, {LIVE}/icutz - | icutz > {LIVE}/icutz
 <= localtime > /usr/share/zoneinfo/Europe/Paris | /etc/localtime > ../var/db/timezone/localtime | latest 2022a.1.0
+<= {SYSTEM}/+VERSION = \\n 2021a x | {SYSTEM}/Europe/Paris -
 wrong: no directory <= live system, tz_latest -, tz -
 wrong: zoneinfo <= zoneinfo - | zoneinfo / | zoneinfo > {LIVE}/zoneinfo | zoneinfo > @2021b.1.0/icutz
 wrong: zoneinfo <= zoneinfo > @2021b.1.0 | zoneinfo > @2021b.1.0/ | zoneinfo > {SYSTEM}/
@@ -188,7 +189,8 @@ wrong: localtime <= localtime - | localtime > zoneinfo/Europe/Paris | localtime 
 wrong: localtime <= localtime > /var/db/timezone/zoneinfo/Mars | localtime = TZif | localtime > /usr/share/zoneinfo/Mars
 wrong: /etc/localtime <= /etc/localtime > /usr/share/zoneinfo/Europe/Paris | /etc/localtime =
 wrong: tz_latest <= tz_latest > /elsewhere | tz_latest > @ | live system, tz_latest = | latest 2147483648a
-note: the latest dataset <= latest 2022a.1.0 46l | latest 2022a.1.0 - | tz_latest > @2022a.1.0 | tz_latest > @2021b.1.0/
+note: the latest dataset <= latest 2022a.1.0, tz/2022a.1.0/icutz/icutz44l.dat mode 640 | latest 2022a.1.0 46l
+note: the latest dataset <= latest 2022a.1.0 - | tz_latest > @2022a.1.0 | tz_latest > @2021b.1.0/
 note: /usr/share/zoneinfo <= /usr/share/zoneinfo -
 note: there are unused datasets <= marker | needs_cleanup.begun =
 """
