@@ -22,6 +22,8 @@ SHORT = {
     "live": f"{DATASET}, zoneinfo > @{{0}}/zoneinfo, icutz > @{{0}}/icutz",
     "live system": "zoneinfo > /usr/share/zoneinfo.default, icutz -",
     "latest": f"{DATASET}, tz_latest > @{{0}}",
+    "new": DATASET.replace("tz/{0}", "new/{0}"),
+    "classic": "/usr/share/zoneinfo > /var/db/timezone/zoneinfo, /etc/localtime > /usr/share/zoneinfo/Europe/Paris",
     "marker": "needs_cleanup =",
     "record": "TZVersionDiffRecord = {0}",
     "localtime reset": "localtime > /var/db/timezone/zoneinfo/America/Los_Angeles",
@@ -65,18 +67,18 @@ def create(path, kind="", text=""):
 
 
 def stage(situation):
-    for path in [*Path("/var").iterdir(), *Path("/usr/share").iterdir()]:
+    for path in [*Path("/var").iterdir(), *Path("/usr/share").iterdir(), *Path("/etc").glob("localtime*")]:
         create(path, "-")
     for statement in f"tz /, {DEFAULT}, {situation}".split(", "):
         for full in filter(None, in_full(statement)):
             path, *rest = full.split(" ", 2)
-            create(Path(STATE, path.replace(r"\n", "\n")), *rest)
+            create(Path(STATE, path.encode().decode("unicode_escape")), *rest)
 
 
 def read_disk():
-    """Returns what is below /var and /usr/share, by path, in the notation of boots.txt."""
+    """Returns what is below /var and /usr/share, and the local time, by path, in the notation of boots.txt."""
     disk = {}
-    for path in [*Path("/var").rglob("*"), *Path("/usr/share").rglob("*")]:
+    for path in [*Path("/var").rglob("*"), *Path("/usr/share").rglob("*"), *Path("/etc").glob("localtime*")]:
         if path.is_symlink():
             disk[str(path)] = f"> {os.readlink(path)}"
         elif path.is_file():
@@ -85,16 +87,16 @@ def read_disk():
             disk[str(path)] = "/" if path.is_dir() else "fifo"
         if (mode := path.lstat().st_mode & 0o7777) not in (0o644, 0o755, 0o777):
             disk[str(path)] += f" mode {mode:o}"
+        disk[str(path)] += " of another user" * (path.lstat().st_uid != 0)
     return disk
 
 
 def compare(expected, seen):
-    """Fails with the lines that differ. What is compared has one value or a list for each name."""
-
-    def as_lines(values):
-        return [f"{n} {v}" for n, vs in sorted(values.items()) for v in (vs if isinstance(vs, list) else [vs])]
-
-    differs = [ascii(line)[1:-1] for line in difflib.ndiff(as_lines(expected), as_lines(seen)) if line[0] in "-+"]
+    """Fails with the lines that differ. What is compared has names with values, which may be several lines."""
+    lines = [
+        "\n".join(f"{name} {value}" for name, value in sorted(all.items())).split("\n") for all in (expected, seen)
+    ]
+    differs = [ascii(line)[1:-1] for line in difflib.ndiff(*lines) if line[0] in "-+"]
     if differs:
         pytest.fail("\n".join(differs), pytrace=False)
 
@@ -105,12 +107,13 @@ def run(command=RELEASE):
     return result.returncode, (result.stdout + result.stderr).splitlines()
 
 
-def read_boots():
-    """Yields situation, changes, warnings, exit status and command of each boot."""
-    text = re.sub(r"^#.*\n", "", Path("tests/boots.txt").read_text(), flags=re.MULTILINE)
-    for paragraph in re.split(r"\n\n+", re.sub(r"\n {3,}", " ", text).strip()):
+def read_paragraphs(path):
+    """Yields name, situation, changes, texts, exit status and script of each case in a file."""
+    text = re.sub(r"^#.*\n", "", Path(path).read_text(), flags=re.MULTILINE)
+    for paragraph in re.split(r"\n+(?! )", re.sub(r"\n {3,}", " ", text).strip()):
         first, *lines = paragraph.split("\n  ")
-        rows = {"!": [], "run": [], "|": []}
+        first, *texts = first.split(" ! ")
+        rows = {"!": texts, "run": [], "|": []}
         for line in lines:
             kind, _, rest = line.partition(" ")
             rows[kind] += rest.split(f" {kind} ")
@@ -118,27 +121,30 @@ def read_boots():
             name, colon, situation = first.partition(":")
             assert colon, f"no colon after the name: {first}"
             situation, _, changes = situation.replace("*", case).partition("-> ")
-            warnings = [f"tzreconcile: {text.replace('*', case)}" for text in rows["!"] if text != "exit 1"]
-            status = int("exit 1" in rows["!"])
+            texts = [text.replace("*", case) for text in rows["!"] if text != "exit 1"]
             name += f": {case}" if rows["|"] else ""
             script = "".join(rows["run"]).replace("*", case)
-            by_script = {"script": ["bash", "-c", script, *RELEASE]}
-            for label, command in (by_script if script else BINARIES).items():
-                boot = situation.strip(), changes, warnings, status, command
-                yield pytest.param(*boot, id=f"{name}-{label}")
+            yield name, situation.strip(), changes, texts, int("exit 1" in rows["!"]), script
+
+
+def read_boots():
+    """Yields situation, changes, warnings, exit status and command of each boot."""
+    for name, *boot, texts, status, script in read_paragraphs("tests/boots.txt"):
+        warnings = [f"tzreconcile: {text}" for text in texts]
+        for label, command in ({"script": ["bash", "-c", script, *RELEASE]} if script else BINARIES).items():
+            yield pytest.param(*boot, warnings, status, command, id=f"{name}-{label}")
 
 
 @pytest.mark.parametrize("situation, changes, warnings, status, command", read_boots())
 def test_boot(situation, changes, warnings, status, command):
     stage(f"{situation}, {changes}")
-    expected = {"exit": status, "!": warnings} | read_disk()
+    expected = {"exit": status, "!": "\n! ".join(warnings)} | read_disk()
     stage(situation)
     os.utime(STATE, (0, 0))
     status, texts = run(command)
-    texts = [cut if (cut := text.rpartition(": ")[0]) in warnings else text for text in texts]
-    if texts and warnings == ["tzreconcile: any"]:
-        texts = warnings
-    compare(expected, {"exit": status, "!": texts} | read_disk())
+    texts = warnings if texts and warnings == ["tzreconcile: any"] else texts
+    seen = [begin if text.startswith(begin) else text for text, begin in zip(texts, warnings + texts)]
+    compare(expected, {"exit": status, "!": "\n! ".join(seen)} | read_disk())
     if not changes and not texts:
         assert os.stat(STATE).st_mtime == 0, "a quiet boot has written to the state directory"
 
