@@ -4,8 +4,9 @@
 
 namespace dataset {
 
-/// One kind of data in a dataset, read by the constructor. Create components with `std::make_shared` of the concrete
-/// class: the destructor is not virtual, and such a handle remembers the class.
+/// One kind of data in a dataset, read by the constructor. The kinds are classes so that a further one needs no change
+/// where datasets are compared and made live. Create components with `std::make_shared` of the concrete class: the
+/// destructor is not virtual, and such a handle remembers the class.
 class vrel_dataset_component {
  public:
   vrel_dataset_component(const vrel_dataset_component&) = delete;
