@@ -37,7 +37,6 @@ os.umask(0o022)
 
 def in_full(statement):
     """Returns the statements on paths that a statement stands for."""
-    assert "," not in statement, f"a comma without a blank behind it: {statement}"
     name, *words = statement.split(" ")
     full = SHORT.get(statement) or SHORT.get(name)
     return full.format(*words, "44l").split(", ") if full else [statement]
