@@ -10,6 +10,7 @@ from pathlib import Path
 import pytest
 
 STATE = "/var/db/timezone/"
+TZ = f"{STATE}tz/"
 RELEASE = os.environ.get("TZRECONCILE", "build/release/tzreconcile").split()
 BINARIES = {"release": RELEASE, "sanitized": ["build/dev/tzreconcile"]}
 IN_2041 = 2240611200  # Seconds that do not fit into 32 bits.
@@ -53,7 +54,7 @@ def create(path, kind="", text=""):
     path.parent.mkdir(parents=True, exist_ok=True)
     match kind:
         case ">":
-            path.symlink_to(text.replace("@", f"{STATE}tz/"))
+            path.symlink_to(text.replace("@", TZ))
         case "=":
             path.write_bytes(text.encode().decode("unicode_escape").encode("latin-1"))
             os.utime(path, (IN_2041, IN_2041))
@@ -120,7 +121,7 @@ def read_paragraphs(path):
             name, colon, situation = first.partition(":")
             assert colon, f"no colon after the name: {first}"
             situation, _, changes = situation.replace("*", case).partition("-> ")
-            texts = [text.replace("*", case) for text in rows["!"] if text != "exit 1"]
+            texts = [text.replace("*", case).replace("@", TZ) for text in rows["!"] if text != "exit 1"]
             name += f": {case}" if rows["|"] else ""
             script = "".join(rows["run"]).replace("*", case)
             yield name, situation.strip(), changes, texts, int("exit 1" in rows["!"]), script
